@@ -1,0 +1,45 @@
+#pragma once
+
+// Owners of what the system hands out: they close it when they go.
+
+#include <cstdio>
+#include <memory>
+#include <unistd.h>
+#include <utility>
+
+namespace bakjob
+{
+
+class UniqueFd
+{
+public:
+    UniqueFd() = default;
+    explicit UniqueFd(int fd) : fd_(fd) {}
+    UniqueFd(UniqueFd &&other) noexcept : fd_(std::exchange(other.fd_, -1)) {}
+    UniqueFd &operator=(UniqueFd &&other) noexcept
+    {
+        std::swap(fd_, other.fd_);
+        return *this;
+    }
+    UniqueFd(const UniqueFd &) = delete;
+    UniqueFd &operator=(const UniqueFd &) = delete;
+    ~UniqueFd() { reset(); }
+
+    [[nodiscard]] int get() const { return fd_; }
+    explicit operator bool() const { return fd_ >= 0; }
+    int release() { return std::exchange(fd_, -1); }
+    void reset()
+    {
+        if (fd_ >= 0) close(release());
+    }
+
+private:
+    int fd_ = -1;
+};
+
+struct CloseFile {
+    void operator()(std::FILE *file) const { std::fclose(file); }
+};
+using UniqueFile = std::unique_ptr<std::FILE, CloseFile>;
+
+} // namespace bakjob

@@ -1,0 +1,64 @@
+#include "common/job_files.h"
+
+namespace bakjob
+{
+
+namespace
+{
+
+std::string named_after(std::string_view prefix, std::string_view job_name, std::string_view suffix = {})
+{
+    std::string name(prefix);
+    name += job_name;
+    name += suffix;
+    return name;
+}
+
+std::string snapshot_prefix(std::string_view job_name)
+{
+    return named_after(job_name.empty() ? "backup" : job_name, ".");
+}
+
+} // namespace
+
+std::string pid_file(std::string_view job_name)
+{
+    return named_after("/var/run/bakjob_", job_name, ".pid");
+}
+
+std::string password_file(std::string_view job_name)
+{
+    return named_after("/tmp/r_", job_name, ".passwd");
+}
+
+std::string progress_file(std::string_view job_name)
+{
+    return named_after("/tmp/rsync_bakcup_src_folder_name.", job_name);
+}
+
+std::string transfer_file(std::string_view job_name)
+{
+    return named_after("/tmp/r_", job_name);
+}
+
+std::string transfer_size_file(std::string_view job_name)
+{
+    return named_after("/tmp/r_", job_name, ".dump_size");
+}
+
+std::string remote_config_copy(std::string_view job_name)
+{
+    return named_after("/tmp/remote_rshareinfo_", job_name, ".txt");
+}
+
+std::string snapshot_name(std::string_view job_name, int number)
+{
+    return snapshot_prefix(job_name) + std::to_string(number);
+}
+
+bool is_snapshot_name(std::string_view job_name, std::string_view entry)
+{
+    return entry != "." && entry != ".." && entry.starts_with(snapshot_prefix(job_name));
+}
+
+} // namespace bakjob

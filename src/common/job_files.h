@@ -1,0 +1,35 @@
+#pragma once
+
+// Every name that the module gives to a file, built and recognised here alone. The functions take a job name
+// that is_job_name (shell_text.h) accepts; paths are not escaped for the shell.
+
+#include <string>
+#include <string_view>
+
+namespace bakjob
+{
+
+inline constexpr const char *CONFIG_FILE = "/etc/NAS_CFG/config.xml";
+inline constexpr const char *CONFIG_LOCK_FILE = "/tmp/rsync_write_conf.lock";
+inline constexpr const char *SERIAL_FILE = "/tmp/kv_serial.txt";
+inline constexpr const char *TRACE_FILE = "/tmp/rsync_debug";
+
+std::string pid_file(std::string_view job_name);
+std::string password_file(std::string_view job_name);
+std::string progress_file(std::string_view job_name);
+
+// Written by the appliance's rsync: what a transfer has moved, and the sizes that its dry run found.
+std::string transfer_file(std::string_view job_name);
+std::string transfer_size_file(std::string_view job_name);
+
+// Local copy of the remote daemon's configuration.
+std::string remote_config_copy(std::string_view job_name);
+
+// Name of a snapshot folder inside the job's local folder: the job's name (or "backup") and the number, 0 the
+// newest, with a full stop between them.
+std::string snapshot_name(std::string_view job_name, int number);
+
+// Whether a folder entry is a snapshot of the job by its name alone: anything may follow the full stop.
+bool is_snapshot_name(std::string_view job_name, std::string_view entry);
+
+} // namespace bakjob

@@ -1,0 +1,139 @@
+#include "common/shell.h"
+
+#include "common/text.h"
+
+#include <cerrno>
+#include <csignal>
+#include <cstdio>
+#include <cstring>
+#include <fcntl.h>
+#include <sys/prctl.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+namespace bakjob
+{
+
+namespace
+{
+
+// While a command runs, an interrupt from the terminal is for the command alone.
+class IgnoreInterrupts
+{
+public:
+    IgnoreInterrupts()
+    {
+        struct sigaction ignore {
+        };
+        ignore.sa_handler = SIG_IGN;
+        sigaction(SIGINT, &ignore, &interrupt_);
+        sigaction(SIGQUIT, &ignore, &quit_);
+    }
+    IgnoreInterrupts(const IgnoreInterrupts &) = delete;
+    IgnoreInterrupts &operator=(const IgnoreInterrupts &) = delete;
+    ~IgnoreInterrupts() { restore(); }
+
+    void restore() const
+    {
+        sigaction(SIGINT, &interrupt_, nullptr);
+        sigaction(SIGQUIT, &quit_, nullptr);
+    }
+
+private:
+    struct sigaction interrupt_ {
+    };
+    struct sigaction quit_ {
+    };
+};
+
+// In the child: never returns. `output` below 0 keeps the program's own standard output.
+[[noreturn]] void become_shell(const char *command, int output, pid_t runner)
+{
+    // A command must not go on when its runner is gone.
+    prctl(PR_SET_PDEATHSIG, SIGKILL);
+    if (getppid() != runner) _exit(127);
+    std::signal(SIGPIPE, SIG_DFL);
+    const int nothing = open("/dev/null", O_RDONLY | O_CLOEXEC);
+    if (nothing >= 0) dup2(nothing, STDIN_FILENO);
+    if (output >= 0) dup2(output, STDOUT_FILENO);
+    const char *const environment[] = {"PATH=/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin",
+                                       "LC_ALL=C", nullptr};
+    execle("/bin/sh", "sh", "-f", "-c", command, nullptr, environment);
+    _exit(127);
+}
+
+int wait_for(pid_t child)
+{
+    int status = 0;
+    while (waitpid(child, &status, 0) < 0) {
+        if (errno != EINTR) return -1;
+    }
+    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+}
+
+} // namespace
+
+int run_shell(const std::string &command)
+{
+    std::fflush(stdout);
+    const pid_t runner = getpid();
+    const IgnoreInterrupts ignore;
+    const pid_t child = fork();
+    if (child == 0) {
+        ignore.restore();
+        become_shell(command.c_str(), -1, runner);
+    }
+    return child < 0 ? -1 : wait_for(child);
+}
+
+ShellReader::ShellReader(const std::string &command)
+{
+    std::fflush(stdout);
+    int ends[2];
+    if (pipe2(ends, O_CLOEXEC) != 0) return;
+    UniqueFd reading(ends[0]);
+    const UniqueFd writing(ends[1]);
+    const pid_t runner = getpid();
+    child_ = fork();
+    if (child_ == 0) become_shell(command.c_str(), writing.get(), runner);
+    if (child_ < 0) return;
+    output_.reset(fdopen(reading.get(), "r"));
+    if (output_) reading.release();
+}
+
+ShellReader::~ShellReader()
+{
+    close();
+}
+
+bool ShellReader::read_line(std::string &line)
+{
+    char buffer[1024];
+    if (!output_ || std::fgets(buffer, sizeof buffer, output_.get()) == nullptr) return false;
+    line = buffer;
+    return true;
+}
+
+int ShellReader::close()
+{
+    output_.reset();
+    const int status = child_ > 0 ? wait_for(child_) : -1;
+    child_ = -1;
+    return status;
+}
+
+std::optional<std::string> first_reply_line(const std::string &command)
+{
+    ShellReader reply(command);
+    if (!reply.started()) return std::nullopt;
+    std::string first;
+    reply.read_line(first);
+    std::string rest;
+    while (reply.read_line(rest)) {
+    }
+    reply.close();
+    trim_right(first);
+    return first;
+}
+
+} // namespace bakjob

@@ -1,0 +1,56 @@
+#pragma once
+
+// The one module that runs commands: through the system shell, one at a time, waited for. Commands see a
+// fixed environment (the standard folders for programs, messages in English), nothing on their standard
+// input, and no file-name patterns: an IPv6 host in brackets is not one.
+
+#include "common/handles.h"
+
+#include <cstddef>
+#include <optional>
+#include <string>
+#include <sys/types.h>
+
+namespace bakjob
+{
+
+inline constexpr std::size_t COMMAND_SIZE = 2048; // bytes of a command, terminator included
+
+// Whether a composed command fits its buffer. One that does not is refused, never cut.
+inline bool fits_command(const std::string &command)
+{
+    return command.size() < COMMAND_SIZE;
+}
+
+// Runs the command and waits. Its exit code; 128 and the signal's number when a signal ended it; -1 when it
+// could not be started.
+int run_shell(const std::string &command);
+
+// A command whose output is read line by line.
+class ShellReader
+{
+public:
+    explicit ShellReader(const std::string &command);
+    ShellReader(const ShellReader &) = delete;
+    ShellReader &operator=(const ShellReader &) = delete;
+    ~ShellReader();
+
+    // Whether the command could be started.
+    [[nodiscard]] bool started() const { return output_ != nullptr; }
+
+    // The next line with its line break, or the next 1023 bytes of a longer one; false at the end.
+    bool read_line(std::string &line);
+
+    // Stops reading and waits; the result of run_shell.
+    int close();
+
+private:
+    UniqueFile output_;
+    pid_t child_ = -1;
+};
+
+// The first line (at most 1023 bytes) of the command's output without trailing white space; the rest is read
+// and thrown away, so the command always runs to its end. Nothing when it could not be started.
+std::optional<std::string> first_reply_line(const std::string &command);
+
+} // namespace bakjob

@@ -1,0 +1,150 @@
+#include "common/shell_text.h"
+
+#include "common/debug_log.h"
+#include "common/text.h"
+
+#include <algorithm>
+
+namespace bakjob
+{
+
+namespace
+{
+
+constexpr std::size_t JOB_NAME_LENGTH = 127;
+constexpr std::string_view LEFT_TO_THE_SHELL = "\"\\|<>*?"; // by escape_path
+constexpr std::string_view SHELL_SPECIAL = "\"\\|<>*?$`#&(){};[]'!~";
+
+bool refused(const char *field, const char *why)
+{
+    DebugLog("ERROR: %s refused: %s\n", field, why);
+    return false;
+}
+
+bool is_control(char c)
+{
+    const auto code = static_cast<unsigned char>(c);
+    return code < ' ' || code == 127;
+}
+
+bool holds_control(std::string_view text)
+{
+    return std::any_of(text.begin(), text.end(), is_control);
+}
+
+bool holds_any(std::string_view text, std::string_view characters)
+{
+    return text.find_first_of(characters) != std::string_view::npos;
+}
+
+// `ending` holds the characters that end a name of this kind within rsync's or ssh's own argument.
+bool is_safe_name(const char *field, std::string_view name, std::string_view ending)
+{
+    if (name.starts_with('-')) return refused(field, "begins with an option's dash");
+    if (holds_control(name) || contains(name, " ")) return refused(field, "blank or control character");
+    if (holds_any(name, SHELL_SPECIAL)) return refused(field, "character special to the shell");
+    if (holds_any(name, ending)) return refused(field, "character that ends a name");
+    return true;
+}
+
+std::string with_backslashes(std::string_view text, std::string_view before)
+{
+    std::string result;
+    for (const char c : text) {
+        if (contains(before, {&c, 1})) result += '\\';
+        result += c;
+    }
+    return result;
+}
+
+} // namespace
+
+bool is_job_name(std::string_view name)
+{
+    return !name.empty() && name.size() <= JOB_NAME_LENGTH && name != "." && name != ".." &&
+           !holds_control(name) && !holds_any(name, LEFT_TO_THE_SHELL) && !contains(name, "/");
+}
+
+std::optional<std::string> shell_path(const char *field, std::string_view path)
+{
+    if (holds_control(path) || holds_any(path, LEFT_TO_THE_SHELL)) {
+        refused(field, "character special to the shell");
+        return std::nullopt;
+    }
+    if (path.starts_with('-')) {
+        refused(field, "begins with an option's dash");
+        return std::nullopt;
+    }
+    std::string escaped = escape_path(path);
+    if (escaped.size() >= PATH_SIZE) {
+        refused(field, "too long");
+        return std::nullopt;
+    }
+    return escaped;
+}
+
+std::string shell_word(std::string_view job_name)
+{
+    return escape_path(job_name);
+}
+
+std::string grep_word(std::string_view job_name)
+{
+    const std::string pattern = with_backslashes(job_name, "\\.[]*^$");
+    const bool plain = escape_path(pattern) == pattern && !contains(pattern, "\\");
+    return plain ? pattern : in_single_quotes(pattern);
+}
+
+bool is_safe_host(std::string_view remote_ip)
+{
+    // A bracket pair is the caller's to write, around an IPv6 address.
+    return is_safe_name("remote_ip", remote_ip, "/@");
+}
+
+bool is_safe_user(const char *field, std::string_view user)
+{
+    return is_safe_name(field, user, "/:");
+}
+
+bool is_safe_port(std::string_view port)
+{
+    const std::string_view trimmed = port.substr(0, port.find_last_not_of(' ') + 1);
+    if (holds_control(trimmed) || contains(trimmed, " ")) {
+        return refused("port", "blank or control character");
+    }
+    return !holds_any(trimmed, SHELL_SPECIAL) || refused("port", "character special to the shell");
+}
+
+bool is_base64(const char *field, std::string_view password)
+{
+    const auto allowed = [](char c) {
+        return (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') || (c >= '0' && c <= '9') ||
+               contains("+/=", {&c, 1});
+    };
+    return std::all_of(password.begin(), password.end(), allowed) || refused(field, "not base64 text");
+}
+
+std::string in_double_quotes(std::string_view text)
+{
+    return '"' + with_backslashes(text, "$`\"\\") + '"';
+}
+
+std::string in_single_quotes(std::string_view text)
+{
+    std::string quoted = "'";
+    for (const char c : text) {
+        if (c == '\'') {
+            quoted += "'\\''";
+        } else {
+            quoted += c;
+        }
+    }
+    return quoted + '\'';
+}
+
+std::string in_backquotes(std::string_view text)
+{
+    return with_backslashes(text, "$`\\");
+}
+
+} // namespace bakjob

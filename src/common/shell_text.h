@@ -1,0 +1,46 @@
+#pragma once
+
+// The one place that knows what may stand in a command and how it is written there. Ordinary values pass
+// unchanged; a value that would make the shell, rsync or ssh do something else is quoted where that is
+// possible, and refused where it is not. A refusal is traced with the name of the field.
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+namespace bakjob
+{
+
+// Whether a text can be a job's name: 1 to 127 bytes, no file-name step ("/", ".", ".."), no control
+// character and nothing that escape_path would leave to the shell.
+bool is_job_name(std::string_view name);
+
+// A path as a word of a command: escaped once. Refused when it holds a character that the escaping leaves to
+// the shell, begins with "-" (an option), or does not fit PATH_SIZE when escaped. `field` names it in the
+// trace.
+std::optional<std::string> shell_path(const char *field, std::string_view path);
+
+// A job name, or a file name made of one, as part of a word. Only for names that is_job_name accepts, or the
+// empty one.
+std::string shell_word(std::string_view job_name);
+
+// A grep pattern, as part of a word, that matches the job name and nothing else.
+std::string grep_word(std::string_view job_name);
+
+// Whether a host or user name may stand in a command as it is: no blank, no control character, nothing that
+// the shell acts on, no leading "-", nothing that would end the name for rsync or ssh.
+bool is_safe_host(std::string_view remote_ip);
+bool is_safe_user(const char *field, std::string_view user);
+
+// Whether a port text may stand in a command: nothing that the shell acts on, blanks only at its end.
+bool is_safe_port(std::string_view port);
+
+// Whether a password is base64 text, the only kind that goes into a command.
+bool is_base64(const char *field, std::string_view password);
+
+// Contexts that read a text once more. Each is an explicit further step around an already escaped text.
+std::string in_double_quotes(std::string_view text); // with the quotes
+std::string in_single_quotes(std::string_view text); // with the quotes
+std::string in_backquotes(std::string_view text);    // without them
+
+} // namespace bakjob

@@ -1,0 +1,89 @@
+#include "common/text.h"
+
+#include <cstdarg>
+#include <cstdio>
+#include <cstring>
+
+namespace bakjob
+{
+
+namespace
+{
+
+constexpr std::string_view ESCAPED = "$`#%^&(){}+;[]'= ";
+
+bool is_trimmed(char c)
+{
+    const auto code = static_cast<unsigned char>(c);
+    return code <= ' ' || code == 127;
+}
+
+} // namespace
+
+bool copy_text(char *field, std::size_t size, std::string_view source)
+{
+    if (source.size() >= size) return false;
+    std::memmove(field, source.data(), source.size());
+    field[source.size()] = '\0';
+    return true;
+}
+
+std::string format_text(const char *format, ...)
+{
+    va_list arguments;
+    va_list again;
+    va_start(arguments, format);
+    va_copy(again, arguments);
+    const int length = std::vsnprintf(nullptr, 0, format, arguments);
+    va_end(arguments);
+    std::string text(length > 0 ? static_cast<std::size_t>(length) : 0, '\0');
+    if (length > 0) std::vsnprintf(text.data(), text.size() + 1, format, again);
+    va_end(again);
+    return text;
+}
+
+void trim_right(char *text)
+{
+    std::size_t length = std::strlen(text);
+    while (length > 0 && is_trimmed(text[length - 1])) {
+        text[--length] = '\0';
+    }
+}
+
+void trim_right(std::string &text)
+{
+    while (!text.empty() && is_trimmed(text.back())) {
+        text.pop_back();
+    }
+}
+
+std::string escape_path(std::string_view path)
+{
+    std::string escaped;
+    for (const char c : path) {
+        if (contains(ESCAPED, {&c, 1})) escaped += '\\';
+        escaped += c;
+    }
+    return escaped;
+}
+
+} // namespace bakjob
+
+char *fix_path_special_char(char *text)
+{
+    const std::string escaped = bakjob::escape_path(text);
+    if (escaped == text) return nullptr;
+    std::size_t length = escaped.size();
+    if (length >= bakjob::PATH_SIZE) {
+        length = bakjob::PATH_SIZE - 1;
+        // A backslash without its character would escape whatever the caller writes next.
+        std::size_t backslashes = 0;
+        while (backslashes < length && escaped[length - 1 - backslashes] == '\\') {
+            ++backslashes;
+        }
+        length -= backslashes % 2;
+    }
+    std::memcpy(text, escaped.data(), length);
+    text[length] = '\0';
+    return text;
+}

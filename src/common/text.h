@@ -1,0 +1,46 @@
+#pragma once
+
+// Small text routines: bounded copies into record fields, formatting, trimming, and the escape rule for
+// paths. The rules about what may go into a command at all are in shell_text.h.
+
+#include <cstddef>
+#include <optional>
+#include <string>
+#include <string_view>
+
+namespace bakjob
+{
+
+inline constexpr std::size_t PATH_SIZE = 1024; // bytes of a path buffer, terminator included
+
+// Copies `source` into the field as a terminated text. A text that does not fit is refused: false, and the
+// field is as it was.
+bool copy_text(char *field, std::size_t size, std::string_view source);
+
+template <std::size_t N>
+bool copy_text(char (&field)[N], std::string_view source)
+{
+    return copy_text(field, N, source);
+}
+
+// printf into a string of whatever length it takes.
+[[gnu::format(printf, 1, 2)]] std::string format_text(const char *format, ...);
+
+inline bool contains(std::string_view text, std::string_view part)
+{
+    return text.find(part) != std::string_view::npos;
+}
+
+// Removes trailing white space and control characters (those of the C locale) in place.
+void trim_right(char *text);
+void trim_right(std::string &text);
+
+// The text with a backslash before each of the characters $ ` # % ^ & ( ) + { } ; [ ] ' = and blank.
+std::string escape_path(std::string_view path);
+
+} // namespace bakjob
+
+// escape_path in place, for users outside the module. `text` must have room for PATH_SIZE bytes; an escaped
+// text that would not fit ends before the first character that does not. Null, and the text untouched, when
+// nothing needs an escape; else `text`.
+extern "C" char *fix_path_special_char(char *text);

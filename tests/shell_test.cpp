@@ -1,0 +1,136 @@
+#include "common/shell.h"
+#include "common/shell_text.h"
+#include "common/text.h"
+#include "support.h"
+
+#include <csignal>
+#include <unistd.h>
+
+using namespace bakjob;
+
+class Shell : public Appliance
+{
+};
+
+TEST_F(Shell, ReportsHowACommandEnded)
+{
+    EXPECT_EQ(run_shell("true"), 0);
+    EXPECT_EQ(run_shell("exit 23"), 23);
+    EXPECT_EQ(run_shell("kill -9 $$"), 128 + SIGKILL);
+    EXPECT_EQ(run_shell("/no/such/program 2>/dev/null"), 127);
+    ShellReader reader("echo one; exit 5");
+    std::string line;
+    EXPECT_TRUE(reader.read_line(line));
+    EXPECT_EQ(line, "one\n");
+    EXPECT_EQ(reader.close(), 5);
+}
+
+TEST_F(Shell, CommandsSeeAFixedWorld)
+{
+    setenv("LC_ALL", "de_DE.UTF-8", 1);
+    setenv("SMUGGLED", "1", 1);
+    write_file("/tmp/here/a[b]", "");
+    ASSERT_EQ(chdir("/tmp/here"), 0);
+    EXPECT_EQ(first_reply_line("env | grep -c SMUGGLED"), "0");
+    EXPECT_EQ(first_reply_line("echo $LC_ALL $PATH"),
+              "C /usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin");
+    EXPECT_EQ(first_reply_line("echo * [a]*"), "* [a]*") << "no file-name patterns";
+    EXPECT_EQ(first_reply_line("cat; echo end"), "end") << "nothing on standard input";
+}
+
+TEST_F(Shell, OnlyTheFirstLineOfAReplyCounts)
+{
+    EXPECT_EQ(first_reply_line("echo 'a b \t'; echo c"), "a b");
+    EXPECT_EQ(first_reply_line("true"), "");
+    EXPECT_EQ(first_reply_line("head -c 3000 /dev/zero | tr '\\0' x"), std::string(1023, 'x'));
+    // The command must get rid of all its output, however much, and end.
+    EXPECT_EQ(first_reply_line("echo first; head -c 3000000 /dev/zero; touch /tmp/ended"), "first");
+    EXPECT_TRUE(exists("/tmp/ended"));
+}
+
+TEST_F(Shell, ACommandDiesWithItsRunner)
+{
+    const pid_t runner = fork();
+    if (runner == 0) {
+        run_shell("exec sleep 4711");
+        _exit(0);
+    }
+    const auto sleeps = [] { return shell("ps | grep -c '[s]leep 4711'").output == "1\n"; };
+    ASSERT_TRUE(eventually(sleeps));
+    kill(runner, SIGKILL);
+    EXPECT_TRUE(eventually([&] { return !sleeps(); }));
+}
+
+TEST_F(Shell, QuotedNamesReachTheProgramAsTheyAre)
+{
+    const std::vector<std::string> names = {"plain",          "My Photos (2013)",
+                                            " it's 100% #1 ", "$(touch pwned)",
+                                            "`reboot`",       "a;b&c",
+                                            "a=b^c+{d}[e]",   "-rf",
+                                            "~root",          "caf\xc3\xa9",
+                                            "\xff\xfe",       "!x"};
+    for (const std::string &name : names) {
+        ASSERT_TRUE(is_job_name(name)) << name;
+        const std::string file = "/tmp/r_" + name;
+        for (const std::string &word :
+             {shell_word(file), in_double_quotes(file), in_single_quotes(file), *shell_path("x", file)}) {
+            EXPECT_EQ(shell("printf %s " + word).output, file);
+            EXPECT_EQ(shell("echo \"`printf %s " + in_backquotes(word) + "`\"").output, file + "\n");
+            // What ssh hands to the shell at the other end is read once more.
+            EXPECT_EQ(shell("sh -c " + in_single_quotes("printf %s " + word)).output, file);
+        }
+    }
+    EXPECT_EQ(shell_word("daily"), "daily");
+    EXPECT_FALSE(exists("pwned"));
+}
+
+TEST_F(Shell, ASearchedNameIsNoPattern)
+{
+    for (const std::string name : {"a.b", "a[b]", "^a$", "it's", "a b", "$x`", "x(y)+{1}"}) {
+        const std::string find = "grep -c job-name=" + grep_word(name);
+        EXPECT_EQ(shell("printf 'x job-name=%s y\\n' " + shell_word(name) + " | " + find).output, "1\n")
+            << name;
+        EXPECT_EQ(shell("echo \"`printf 'job-name=%s\\n' " + in_backquotes(shell_word(name)) + " | " +
+                        in_backquotes(find) + "`\"")
+                      .output,
+                  "1\n")
+            << name;
+        EXPECT_EQ(shell("printf 'job-name=aXb job-name=ab\\n' | " + find).output, "0\n") << name;
+    }
+    EXPECT_EQ(grep_word("daily-2_x"), "daily-2_x");
+    EXPECT_EQ(grep_word("a.b"), "'a\\.b'");
+}
+
+TEST_F(Shell, WhatCannotBeQuotedIsRefused)
+{
+    for (const std::string name :
+         {"", ".", "..", "a/b", "a\nb", "a\tb", "a\"b", "a\\b", "a|b", "a<b", "a>b", "a*", "a?"}) {
+        EXPECT_FALSE(is_job_name(name)) << name;
+    }
+    EXPECT_TRUE(is_job_name(std::string(127, 'x')));
+    EXPECT_FALSE(is_job_name(std::string(128, 'x')));
+    for (const std::string path :
+         {"/a\"b", "/a\\b", "/a|b", "/a<b", "/a>b", "/a*", "/a?", "/a\tb", "/a\nb", "-rf"}) {
+        EXPECT_FALSE(shell_path("x", path)) << path;
+    }
+    EXPECT_TRUE(shell_path("x", std::string(1023, 'a')));
+    EXPECT_FALSE(shell_path("x", std::string(1024, 'a')));
+    EXPECT_FALSE(shell_path("x", std::string(512, ' '))) << "too long once escaped";
+
+    for (const std::string host :
+         {"-oProxyCommand=x", "a b", "a;b", "$(x)", "`x`", "a'b", "a\nb", "a/b", "a@b", "[::1]"}) {
+        EXPECT_FALSE(is_safe_host(host)) << host;
+    }
+    for (const std::string host : {"10.0.0.1", "nas-2.example", "fe80::1", "fe80::1%eth0"}) {
+        EXPECT_TRUE(is_safe_host(host)) << host;
+    }
+    for (const std::string user : {"-l", "a b", "a:b", "a/b", "a&b", "a\"b"}) {
+        EXPECT_FALSE(is_safe_user("x", user)) << user;
+    }
+    EXPECT_TRUE(is_safe_user("x", "bk@example.org"));
+    EXPECT_TRUE(is_safe_port("873  "));
+    EXPECT_FALSE(is_safe_port("8 73"));
+    EXPECT_FALSE(is_safe_port("873;x"));
+    EXPECT_TRUE(is_base64("x", "cGFrdG8="));
+    EXPECT_FALSE(is_base64("x", "a'b"));
+}

@@ -1,0 +1,217 @@
+#include "support.h"
+
+#include "common/run_options.h"
+#include "config/job_list.h"
+#include "platform/config_store.h"
+
+#include <array>
+#include <chrono>
+#include <filesystem>
+#include <fstream>
+#include <sstream>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <thread>
+#include <unistd.h>
+
+namespace fs = std::filesystem;
+
+std::string read_file(const std::string &path)
+{
+    std::ostringstream text;
+    text << std::ifstream(path, std::ios::binary).rdbuf();
+    return text.str();
+}
+
+void write_file(const std::string &path, const std::string &text)
+{
+    fs::create_directories(fs::path(path).parent_path());
+    std::ofstream(path, std::ios::binary) << text;
+}
+
+bool exists(const std::string &path)
+{
+    return fs::exists(fs::symlink_status(path));
+}
+
+std::string octal_mode(const std::string &path)
+{
+    struct stat status {
+    };
+    if (lstat(path.c_str(), &status) != 0) return "none";
+    std::array<char, 8> mode{};
+    snprintf(mode.data(), mode.size(), "%o", status.st_mode & 07777U);
+    return mode.data();
+}
+
+Ran shell(const std::string &command)
+{
+    std::string output;
+    FILE *const pipe = popen(command.c_str(), "r"); // NOLINT(cert-env33-c)
+    std::array<char, 4096> buffer{};
+    for (std::size_t n = 0; (n = fread(buffer.data(), 1, buffer.size(), pipe)) > 0;) {
+        output.append(buffer.data(), n);
+    }
+    const int status = pclose(pipe);
+    return {WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status), output};
+}
+
+int in_child(const std::function<int()> &body)
+{
+    const pid_t child = fork();
+    if (child == 0) _exit(body());
+    int status = 0;
+    waitpid(child, &status, 0);
+    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+}
+
+bool eventually(const std::function<bool()> &condition, int seconds)
+{
+    const auto end = std::chrono::steady_clock::now() + std::chrono::seconds(seconds);
+    while (!condition()) {
+        if (std::chrono::steady_clock::now() > end) return false;
+        std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    }
+    return true;
+}
+
+void Appliance::SetUp()
+{
+    for (const char *folder : {"/etc/NAS_CFG", "/tmp", "/mnt/HD", "/var/lib/device_flash", "/remote/backup",
+                               "/remote/data", "/remote/archive"}) {
+        fs::create_directories(folder);
+        for (const auto &entry : fs::directory_iterator(folder))
+            fs::remove_all(entry.path());
+    }
+    for (const auto &entry : fs::directory_iterator("/run")) {
+        if (entry.path().filename().string().starts_with("bakjob_")) fs::remove_all(entry.path());
+    }
+    fs::remove("/var/log/device_alerts");
+    fs::remove("/etc/cron.d/device_scheduler");
+    bakjob::run_options = {};
+}
+
+void Appliance::TearDown()
+{
+    bakjob::rsync_free_jobs();
+    fs::current_path("/");
+}
+
+void store_set(const std::string &path, const std::string &text)
+{
+    ASSERT_EQ(xml_set_str(path.c_str(), text.c_str()), 0) << path;
+}
+
+std::string store_get(const std::string &path)
+{
+    // A plain path has the store look at its file first.
+    xml_get_int("/backup_mgr/rsync/count");
+    std::array<char, 4096> text{};
+    return xml_get_str(path.c_str(), text.size(), text.data()) < 0 ? "(none)" : text.data();
+}
+
+void store_save()
+{
+    ASSERT_EQ(xml_write_file("/etc/NAS_CFG/config.xml"), 0);
+}
+
+int add_job(const Keys &keys)
+{
+    Keys all{{"enable", "1"},
+             {"state", "0"},
+             {"pwd_encoded", "0"},
+             {"server_type", "2"},
+             {"backup_type", "1"},
+             {"rsync_mode", "2"},
+             {"schedule_mode", "1"},
+             {"use_ssh", "0"},
+             {"keep_exist_file", "0"},
+             {"inc_enable", "0"},
+             {"inc_number", "3"},
+             {"retry", "0"},
+             {"retry_interval", "1"},
+             {"rsync_timeout", "30"},
+             {"job_name", "daily"},
+             {"rsync_user", "bk"},
+             {"rsync_pwd", "secret"},
+             {"ssh_user", "root"},
+             {"ssh_pwd", ""},
+             {"port", "873"},
+             {"remote_ip", "127.0.0.1"},
+             {"remote_path", "backup"},
+             {"local_path", "/mnt/HD/HD_a2/Public"},
+             {"rstate", "0"}};
+    for (const auto &[key, value] : keys)
+        all[key] = value;
+    const int item = std::max(0, xml_get_int("/backup_mgr/rsync/count")) + 1;
+    store_set("/backup_mgr/rsync/count", std::to_string(item));
+    for (const auto &[key, value] : all) {
+        store_set("/backup_mgr/rsync/item:" + std::to_string(item) + "/" + key, value);
+    }
+    store_save();
+    return item;
+}
+
+std::string job_key(int item, const std::string &key)
+{
+    return store_get("/backup_mgr/rsync/item:" + std::to_string(item) + "/" + key);
+}
+
+void add_share(const std::string &name, const std::string &path)
+{
+    const int item = std::max(0, xml_get_int("/system_mgr/samba/share/count")) + 1;
+    store_set("/system_mgr/samba/share/count", std::to_string(item));
+    store_set("/system_mgr/samba/share/item:" + std::to_string(item) + "/name", name);
+    store_set("/system_mgr/samba/share/item:" + std::to_string(item) + "/path", path);
+    store_save();
+    fs::create_directories(path);
+}
+
+bakjob::RsyncJob make_job(const std::string &name)
+{
+    bakjob::RsyncJob job{};
+    job.enable = job.pwd_encoded = 1;
+    job.server_type = job.rsync_mode = 2;
+    job.backup_type = 1;
+    job.rsync_timeout = 600;
+    snprintf(job.job_name, sizeof job.job_name, "%s", name.c_str());
+    snprintf(job.rsync_user, sizeof job.rsync_user, "bk");
+    snprintf(job.rsync_pwd, sizeof job.rsync_pwd, "c2VjcmV0");
+    snprintf(job.port, sizeof job.port, "873");
+    snprintf(job.remote_ip, sizeof job.remote_ip, "192.168.1.20");
+    snprintf(job.remote_path, sizeof job.remote_path, "backup/share1");
+    snprintf(job.local_path, sizeof job.local_path, "/srv/share1");
+    snprintf(job.rsync_pwd_file, sizeof job.rsync_pwd_file, "/tmp/r_%s.passwd", name.c_str());
+    return job;
+}
+
+Fake::Fake(std::string program, const std::string &script) : program_(std::move(program))
+{
+    fs::rename(program_, program_ + ".real");
+    write_file(program_, "#!/bin/sh\n" + script);
+    fs::permissions(program_, fs::perms(0755));
+}
+
+Fake::~Fake()
+{
+    fs::rename(program_ + ".real", program_);
+}
+
+Ran bakjob_program(const std::string &arguments)
+{
+    return shell("/usr/sbin/bakjob " + arguments + " 2>&1");
+}
+
+std::vector<std::string> lines_of(const std::string &text)
+{
+    std::vector<std::string> lines;
+    std::istringstream stream(text);
+    for (std::string line; std::getline(stream, line);)
+        lines.push_back(line);
+    return lines;
+}
+
+std::vector<std::string> alerts()
+{
+    return lines_of(read_file("/var/log/device_alerts"));
+}
