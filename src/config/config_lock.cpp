@@ -1,0 +1,53 @@
+#include "config/config_lock.h"
+
+#include "common/private_file.h"
+
+#include <cerrno>
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace bakjob
+{
+
+namespace
+{
+
+// The lock file lies where others may write. What is not a file of our own could keep us waiting for ever, so
+// it is replaced.
+UniqueFd open_lock_file(const char *path)
+{
+    UniqueFd file = open_own_file(path, O_RDONLY);
+    if (file) return file;
+    if (errno == EPERM || errno == ELOOP || errno == ENXIO) unlink(path);
+    file = create_file(path, 0600);
+    return file ? std::move(file) : open_own_file(path, O_RDONLY);
+}
+
+bool is_still_at(const char *path, int file)
+{
+    struct stat there {
+    };
+    struct stat here {
+    };
+    return lstat(path, &there) == 0 && fstat(file, &here) == 0 && there.st_ino == here.st_ino &&
+           there.st_dev == here.st_dev;
+}
+
+} // namespace
+
+UniqueFd rsync_lock_config(const char *path)
+{
+    for (;;) {
+        UniqueFd file = open_lock_file(path);
+        if (!file) return file;
+        while (flock(file.get(), LOCK_EX) != 0) {
+            if (errno != EINTR) return UniqueFd();
+        }
+        // Somebody may have replaced the file while we waited: then the lock is on the new one.
+        if (is_still_at(path, file.get())) return file;
+    }
+}
+
+} // namespace bakjob

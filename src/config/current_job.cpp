@@ -1,0 +1,24 @@
+#include "config/current_job.h"
+
+#include "common/job_files.h"
+#include "common/text.h"
+
+namespace bakjob
+{
+
+RsyncJob CurrentJob{};
+
+void rsync_prepare_current_job(RsyncJob &job)
+{
+    if (job.rsync_pwd_file[0] == '\0') copy_text(job.rsync_pwd_file, password_file(job.job_name));
+    rsync_copy_job(CurrentJob, job);
+    if (CurrentJob.rsync_user[0] == '\0') copy_text(CurrentJob.rsync_user, "root");
+    if (CurrentJob.rsync_pwd[0] == '\0') {
+        copy_text(CurrentJob.rsync_pwd, DEFAULT_DAEMON_PASSWORD);
+        CurrentJob.pwd_encoded = 0;
+    }
+    if (CurrentJob.port[0] == '\0') copy_text(CurrentJob.port, DEFAULT_PORT);
+    if (CurrentJob.inc_enable != 0) CurrentJob.inc_number = snapshots_kept(CurrentJob.inc_number);
+}
+
+} // namespace bakjob

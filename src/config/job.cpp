@@ -1,0 +1,95 @@
+#include "config/job.h"
+
+#include "common/text.h"
+
+#include <algorithm>
+#include <array>
+
+namespace bakjob
+{
+
+namespace
+{
+
+#define INTEGER(name) .key = #name, .offset = offsetof(RsyncJob, name), .size = 0
+#define TEXT(name) .key = #name, .offset = offsetof(RsyncJob, name), .size = sizeof(RsyncJob::name)
+
+constexpr std::array FIELDS = {
+    JobField{INTEGER(enable)},
+    JobField{INTEGER(state)},
+    JobField{INTEGER(pwd_encoded)},
+    JobField{INTEGER(server_type)},
+    JobField{INTEGER(backup_type)},
+    JobField{INTEGER(rsync_mode)},
+    JobField{INTEGER(schedule_mode)},
+    JobField{INTEGER(use_ssh)},
+    JobField{INTEGER(keep_exist_file)},
+    JobField{INTEGER(inc_enable)},
+    JobField{INTEGER(inc_number)},
+    JobField{INTEGER(retry), .lowest = 0, .highest = 15, .otherwise = 0},
+    JobField{INTEGER(retry_interval), .lowest = 1, .highest = 180, .otherwise = 30},
+    JobField{INTEGER(rsync_timeout), .lowest = 0, .highest = INT_MAX, .otherwise = 600},
+    JobField{TEXT(last_do_job_time)},
+    JobField{TEXT(job_name)},
+    JobField{TEXT(rsync_user)},
+    JobField{TEXT(rsync_pwd)},
+    JobField{TEXT(ssh_user)},
+    JobField{TEXT(ssh_pwd)},
+    JobField{TEXT(port)},
+    JobField{TEXT(remote_ip)},
+    JobField{TEXT(remote_path)},
+    JobField{TEXT(local_path)},
+    JobField{TEXT(rsync_pwd_file)},
+    JobField{TEXT(user_description)},
+    JobField{INTEGER(rstate)},
+    JobField{TEXT(rlast_do_job_time)},
+    JobField{TEXT(in_remote_cloud_fqdn)},
+};
+
+#undef INTEGER
+#undef TEXT
+
+} // namespace
+
+std::span<const JobField> job_fields()
+{
+    return FIELDS;
+}
+
+std::int32_t &integer_field(RsyncJob &job, const JobField &field)
+{
+    return *reinterpret_cast<std::int32_t *>(reinterpret_cast<char *>(&job) + field.offset);
+}
+
+char *text_field(RsyncJob &job, const JobField &field)
+{
+    return reinterpret_cast<char *>(&job) + field.offset;
+}
+
+const std::int32_t &integer_field(const RsyncJob &job, const JobField &field)
+{
+    return integer_field(const_cast<RsyncJob &>(job), field);
+}
+
+const char *text_field(const RsyncJob &job, const JobField &field)
+{
+    return text_field(const_cast<RsyncJob &>(job), field);
+}
+
+void rsync_copy_job(RsyncJob &destination, const RsyncJob &source)
+{
+    for (const JobField &field : FIELDS) {
+        if (field.size == 0) {
+            integer_field(destination, field) = integer_field(source, field);
+        } else {
+            copy_text(text_field(destination, field), field.size, text_field(source, field));
+        }
+    }
+}
+
+int snapshots_kept(int inc_number)
+{
+    return std::clamp(inc_number, 3, 10);
+}
+
+} // namespace bakjob

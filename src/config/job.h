@@ -1,0 +1,81 @@
+#pragma once
+
+// One backup job as it stands in memory: a flat record whose fields carry the names of the job's keys in the
+// configuration store. Texts always hold a terminated string and never more than their size.
+
+#include "common/password.h"
+
+#include <climits>
+#include <cstddef>
+#include <cstdint>
+#include <span>
+
+namespace bakjob
+{
+
+inline constexpr std::size_t JOB_NAME_SIZE = 128;
+inline constexpr const char *DEFAULT_PORT = "873";
+
+enum ServerType : std::int32_t { SERVER_SAME_KIND = 1, SERVER_ANY = 2 };
+enum BackupType : std::int32_t { BACKUP_PUSH = 1, BACKUP_PULL = 2 };
+enum ScheduleMode : std::int32_t { SCHEDULE_TIMETABLE = 1, SCHEDULE_ONCE = 2, SCHEDULE_EVENT = 3 };
+inline constexpr std::int32_t RSYNC_MODE_DAEMON = 2;
+
+struct RsyncJob {
+    std::int32_t enable;
+    std::int32_t state;
+    std::int32_t pwd_encoded; // not 0: rsync_pwd, and ssh_pwd of an ssh job, hold base64 text
+    std::int32_t server_type;
+    std::int32_t backup_type;
+    std::int32_t rsync_mode;
+    std::int32_t schedule_mode;
+    std::int32_t use_ssh;
+    std::int32_t
+        keep_exist_file; // 1: existing files are left alone, 2: and nothing is deleted, else deletion
+    std::int32_t inc_enable;
+    std::int32_t inc_number;
+    std::int32_t retry;          // attempts, 0..15
+    std::int32_t retry_interval; // seconds, 1..180
+    std::int32_t rsync_timeout;  // seconds, 0 for none
+    char last_do_job_time[32];
+    char job_name[JOB_NAME_SIZE];
+    char rsync_user[128];
+    char rsync_pwd[PASSWORD_SIZE];
+    char ssh_user[128];
+    char ssh_pwd[PASSWORD_SIZE];
+    char port[16];
+    char remote_ip[260];
+    char remote_path[1024];
+    char local_path[2600]; // source folders, separated by ":"
+    char rsync_pwd_file[1024];
+    char user_description[128];
+    std::int32_t rstate;
+    char rlast_do_job_time[32];
+    char in_remote_cloud_fqdn[32];
+    RsyncJob *next;
+};
+
+// One field of the record, in the order in which the store keeps the keys.
+struct JobField {
+    const char *key;
+    std::size_t offset;
+    std::size_t size;     // bytes of a text; 0: an integer
+    int lowest = INT_MIN; // an integer outside of lowest..highest is loaded as `otherwise`
+    int highest = INT_MAX;
+    int otherwise = 0;
+};
+
+std::span<const JobField> job_fields();
+
+std::int32_t &integer_field(RsyncJob &job, const JobField &field);
+char *text_field(RsyncJob &job, const JobField &field);
+const std::int32_t &integer_field(const RsyncJob &job, const JobField &field);
+const char *text_field(const RsyncJob &job, const JobField &field);
+
+// Copies every field but `next`.
+void rsync_copy_job(RsyncJob &destination, const RsyncJob &source);
+
+// Snapshots that an incremental job keeps: its `inc_number` brought within 3 to 10.
+int snapshots_kept(int inc_number);
+
+} // namespace bakjob

@@ -1,0 +1,101 @@
+#include "config/job_list.h"
+
+#include "common/text.h"
+
+#include <new>
+
+namespace bakjob
+{
+
+namespace
+{
+
+RsyncJobList the_list{};
+
+// Both passwords become base64 or neither does: `pwd_encoded` speaks for both.
+void encode_passwords(RsyncJob &job, bool with_ssh)
+{
+    char rsync_pwd[PASSWORD_SIZE] = "";
+    char ssh_pwd[PASSWORD_SIZE] = "";
+    if (password_encode(rsync_pwd, job.rsync_pwd, sizeof rsync_pwd) < 0) return;
+    if (with_ssh && password_encode(ssh_pwd, job.ssh_pwd, sizeof ssh_pwd) < 0) return;
+    copy_text(job.rsync_pwd, rsync_pwd);
+    if (with_ssh) copy_text(job.ssh_pwd, ssh_pwd);
+    job.pwd_encoded = 1;
+}
+
+void apply_defaults(RsyncJob &job)
+{
+    const bool arrived_encoded = job.pwd_encoded != 0;
+    if (job.rsync_pwd[0] == '\0') {
+        copy_text(job.rsync_pwd, DEFAULT_DAEMON_PASSWORD);
+        job.pwd_encoded = 0;
+    }
+    if (job.port[0] == '\0') copy_text(job.port, DEFAULT_PORT);
+    // An ssh password that arrived as base64 must not be encoded again with the default.
+    if (job.pwd_encoded == 0) encode_passwords(job, job.use_ssh == 1 && !arrived_encoded);
+}
+
+} // namespace
+
+RsyncJobList *const job_list = &the_list;
+
+int rsync_job_list_empty()
+{
+    return job_list->count == 0 ? 1 : 0;
+}
+
+RsyncJob *rsync_new_job()
+{
+    return new (std::nothrow) RsyncJob{};
+}
+
+int rsync_list_add_job(const RsyncJob &source)
+{
+    if (rsync_find_job(source.job_name) != nullptr) return 0;
+    RsyncJob *const job = rsync_new_job();
+    if (job == nullptr) return 0;
+    (job_list->head == nullptr ? job_list->head : job_list->tail->next) = job;
+    job_list->tail = job;
+    ++job_list->count;
+    rsync_copy_job(*job, source);
+    apply_defaults(*job);
+    return 1;
+}
+
+RsyncJob *rsync_find_job(std::string_view job_name)
+{
+    for (RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+        if (job_name == job->job_name) return job;
+    }
+    return nullptr;
+}
+
+int rsync_list_remove_job(RsyncJob *job)
+{
+    if (job == nullptr) return 0;
+    RsyncJob *before = nullptr;
+    RsyncJob *found = job_list->head;
+    while (found != nullptr && found != job) {
+        before = found;
+        found = found->next;
+    }
+    if (found == nullptr) return 0;
+    (before == nullptr ? job_list->head : before->next) = job->next;
+    if (job_list->tail == job) job_list->tail = before;
+    --job_list->count;
+    delete job;
+    return 1;
+}
+
+void rsync_free_jobs()
+{
+    while (job_list->head != nullptr) {
+        RsyncJob *const job = job_list->head;
+        job_list->head = job->next;
+        delete job;
+    }
+    *job_list = {};
+}
+
+} // namespace bakjob

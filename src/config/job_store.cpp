@@ -1,0 +1,93 @@
+#include "config/job_store.h"
+
+#include "common/job_files.h"
+#include "config/job_list.h"
+#include "config/schedule.h"
+#include "platform/config_store.h"
+
+#include <cstdio>
+#include <cstring>
+
+namespace bakjob
+{
+
+namespace
+{
+
+constexpr const char *JOBS = "/backup_mgr/rsync";
+constexpr const char *JOB_COUNT = "/backup_mgr/rsync/count";
+
+// The path of one key of one item; reused from key to key, as there are tens of thousands of them.
+class ItemPath
+{
+public:
+    explicit ItemPath(int item)
+        : length_(static_cast<std::size_t>(std::snprintf(path_, sizeof path_, "%s/item:%d/", JOBS, item)))
+    {
+    }
+    const char *key(const char *name)
+    {
+        std::snprintf(path_ + length_, sizeof path_ - length_, "%s", name);
+        return path_;
+    }
+
+private:
+    char path_[128];
+    std::size_t length_;
+};
+
+void load_job(RsyncJob &job, int item)
+{
+    ItemPath path(item);
+    for (const JobField &field : job_fields()) {
+        const char *const key = path.key(field.key);
+        if (field.size == 0) {
+            const int value = xml_get_int(key);
+            const bool in_range = value >= field.lowest && value <= field.highest;
+            integer_field(job, field) = in_range ? value : field.otherwise;
+        } else {
+            xml_get_str(key, static_cast<int>(field.size), text_field(job, field));
+        }
+    }
+}
+
+void save_job(const RsyncJob &job, int item)
+{
+    ItemPath path(item);
+    for (const JobField &field : job_fields()) {
+        const char *const key = path.key(field.key);
+        if (field.size == 0) {
+            xml_set_int(key, integer_field(job, field));
+        } else {
+            xml_set_str(key, text_field(job, field));
+        }
+    }
+}
+
+} // namespace
+
+void rsync_load_jobs()
+{
+    rsync_free_jobs();
+    const int count = xml_get_int(JOB_COUNT);
+    for (int item = 1; item <= count; ++item) {
+        RsyncJob job{};
+        load_job(job, item);
+        rsync_list_add_job(job);
+    }
+}
+
+void rsync_save_jobs()
+{
+    xml_del(JOBS);
+    if (rsync_job_list_empty() == 0) xml_set_int(JOB_COUNT, job_list->count);
+    int item = 0;
+    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+        save_job(*job, ++item);
+    }
+    rsync_prune_schedule();
+    xml_write_file(CONFIG_FILE);
+    rsync_free_jobs();
+}
+
+} // namespace bakjob

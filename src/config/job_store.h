@@ -1,0 +1,18 @@
+#pragma once
+
+// The jobs in the configuration store: "/backup_mgr/rsync/count" and the items "/backup_mgr/rsync/item:1" to
+// count, each with the keys of job_fields. Whoever saves holds the configuration lock (config_lock.h) from
+// before the load until after the save.
+
+namespace bakjob
+{
+
+// Empties the list and fills it with every job of the store. Texts are cut at their field's width; numbers
+// out of their range take their default; the second of two jobs of one name is left out.
+void rsync_load_jobs();
+
+// Writes the list in place of the stored jobs, numbered from 1, deletes scheduler entries that name no job
+// any more, writes the configuration file and empties the list.
+void rsync_save_jobs();
+
+} // namespace bakjob

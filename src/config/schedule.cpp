@@ -1,0 +1,146 @@
+#include "config/schedule.h"
+
+#include "common/debug_log.h"
+#include "common/job_files.h"
+#include "config/job_list.h"
+#include "config/store_text.h"
+#include "platform/scheduler.h"
+
+namespace bakjob
+{
+
+namespace
+{
+
+constexpr const char *GROUP = "rsync";
+constexpr const char *GROUP_NODE = "/system_mgr/crond/rsync";
+constexpr const char *ENTRY_COUNT = "/system_mgr/crond/rsync/count";
+constexpr const char *GROUP_COUNT = "/system_mgr/crond/list/count";
+constexpr std::size_t TEXT_SIZE = 256; // bytes of a group's name and of a command, terminator included
+
+struct Group {
+    int groups;            // number of groups that the scheduler has
+    std::string name_path; // where the name of ours stands; empty: there is none
+};
+
+Group find_group()
+{
+    Group group{xml_get_int(GROUP_COUNT), {}};
+    for (int i = 1; i <= group.groups; ++i) {
+        std::string path = format_text("/system_mgr/crond/list/name:%d", i);
+        if (store_text(path, TEXT_SIZE) == GROUP) {
+            group.name_path = std::move(path);
+            break;
+        }
+    }
+    return group;
+}
+
+std::string entry_path(int entry)
+{
+    return format_text("%s/item:%d", GROUP_NODE, entry);
+}
+
+std::string entry_command(int entry)
+{
+    return store_text(entry_path(entry) + "/run", TEXT_SIZE);
+}
+
+void delete_entry(int entry, int entries_left)
+{
+    xml_del(entry_path(entry).c_str());
+    store_decimal(ENTRY_COUNT, entries_left);
+}
+
+void delete_group(const Group &group)
+{
+    xml_del(group.name_path.c_str());
+    store_decimal(GROUP_COUNT, group.groups - 1);
+    xml_del(GROUP_NODE);
+}
+
+// A command that fills its buffer may have been cut before the name, so it is not judged.
+bool is_kept(const std::string &command)
+{
+    return command.size() == TEXT_SIZE - 1 || rsync_schedule_names_job(command) == 1;
+}
+
+int first_entry_holding(const char *job_name, int entries)
+{
+    for (int entry = 1; entry <= entries; ++entry) {
+        if (contains(entry_command(entry), job_name)) return entry;
+    }
+    return 0;
+}
+
+} // namespace
+
+int rsync_schedule_names_job(std::string_view command)
+{
+    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+        if (contains(command, format_text("'%s'", job->job_name))) return 1;
+    }
+    return 0;
+}
+
+void rsync_prune_schedule()
+{
+    const Group group = find_group();
+    if (group.name_path.empty()) return;
+    const int entries = xml_get_int(ENTRY_COUNT);
+    int remaining = entries;
+    int entry = 1; // the entries behind a deleted one move up to its number
+    for (int visited = 0; visited < entries; ++visited) {
+        if (is_kept(entry_command(entry))) {
+            ++entry;
+            continue;
+        }
+        if (remaining == 1) {
+            delete_group(group);
+            LIB_do_ctc();
+            return;
+        }
+        delete_entry(entry, --remaining);
+    }
+    if (remaining != entries) LIB_do_ctc();
+}
+
+void rsync_remove_job_schedule(const char *job_name)
+{
+    const Group group = find_group();
+    if (group.groups <= 0) return;
+    if (group.name_path.empty()) {
+        DebugLog("NOT FOUND (0) this job name [%s]\n", job_name);
+        return;
+    }
+    DebugLog("compare name = [%s]\n", job_name);
+    const int entries = xml_get_int(ENTRY_COUNT);
+    if (entries <= 0) return;
+    const int entry = first_entry_holding(job_name, entries);
+    if (entry == 0) {
+        DebugLog("NOT FOUND (%d) this job name [%s]\n", entries == 1 ? 1 : 2, job_name);
+        return;
+    }
+    if (entries == 1) {
+        delete_group(group);
+    } else {
+        delete_entry(entry, entries - 1);
+    }
+    xml_write_file(CONFIG_FILE);
+    LIB_do_ctc();
+}
+
+void rsync_create_schedule(const char *minute, const char *hour, const char *day, const char *month,
+                           const char *weekday, const char *user, const char *run)
+{
+    LIB_create_xml(minute, hour, day, month, weekday, user, run, GROUP);
+    LIB_do_ctc();
+}
+
+void rsync_delete_schedule()
+{
+    LIB_do_delete_xml(GROUP);
+    LIB_do_ctc();
+}
+
+} // namespace bakjob

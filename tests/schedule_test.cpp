@@ -1,0 +1,114 @@
+#include "config/job_list.h"
+#include "config/job_store.h"
+#include "config/schedule.h"
+#include "platform/config_store.h"
+#include "support.h"
+
+using namespace bakjob;
+
+class Schedule : public Appliance
+{
+protected:
+    // The group "rsync" stands between two others; its entries run these commands.
+    static void set_entries(const std::vector<std::string> &commands)
+    {
+        store_set("/system_mgr/crond/list/count", "3");
+        for (const auto &[number, name] : Keys{{"1", "first"}, {"2", "rsync"}, {"3", "last"}}) {
+            store_set("/system_mgr/crond/list/name:" + number, name);
+        }
+        store_set("/system_mgr/crond/rsync/count", std::to_string(commands.size()));
+        int item = 0;
+        for (const std::string &command : commands) {
+            store_set("/system_mgr/crond/rsync/item:" + std::to_string(++item) + "/run", command);
+        }
+        store_save();
+    }
+
+    static std::string entries()
+    {
+        std::string all;
+        const int count = xml_get_int("/system_mgr/crond/rsync/count");
+        for (int i = 1; i <= count; ++i) {
+            all += store_get("/system_mgr/crond/rsync/item:" + std::to_string(i) + "/run") + "|";
+        }
+        return all;
+    }
+
+    static std::string groups()
+    {
+        return store_get("/system_mgr/crond/list/count") + ":" + store_get("/system_mgr/crond/list/name:1") +
+               "," + store_get("/system_mgr/crond/list/name:2") + "," +
+               store_get("/system_mgr/crond/list/name:3");
+    }
+
+    // "/etc/cron.d/device_scheduler" is written exactly when the scheduler was told.
+    static bool committed() { return exists("/etc/cron.d/device_scheduler"); }
+};
+
+TEST_F(Schedule, PruningKeepsExactlyTheEntriesThatNameAJob)
+{
+    const std::string long_name(127, 'n');
+    struct Case {
+        std::vector<std::string> jobs;
+        std::vector<std::string> commands;
+        std::string left;
+        std::string groups;
+        bool committed;
+    };
+    const std::string all_groups = "3:first,rsync,last";
+    const std::string no_group = "2:first,last,(none)";
+    const std::vector<Case> cases = {
+        {{"a", "b"}, {"-r 'a'", "-r 'c'", "-r 'b'"}, "-r 'a'|-r 'b'|", all_groups, true},
+        {{"a"}, {"-r 'x'", "-r 'y'", "-r 'a'", "-r 'z'"}, "-r 'a'|", all_groups, true},
+        {{}, {"-r 'a'", "-r 'c'", "-r 'b'"}, "", no_group, true},
+        {{"a"}, {"-r 'a'"}, "-r 'a'|", all_groups, false},
+        {{"ab"}, {"-r 'abc'", "-r 'ab'"}, "-r 'ab'|", all_groups, true},
+        {{long_name}, {"-r '" + long_name + "'", "-r 'x'"}, "-r '" + long_name + "'|", all_groups, true},
+        {{"a"}, {}, "", all_groups, false},
+        // Longer than what is read of it: not judged.
+        {{"a"}, {std::string(300, 'x') + "'a'", "-r 'b'"}, std::string(300, 'x') + "'a'|", all_groups, true},
+    };
+    for (const Case &one : cases) {
+        SetUp();
+        set_entries(one.commands);
+        rsync_load_jobs();
+        for (const std::string &name : one.jobs)
+            rsync_list_add_job(make_job(name));
+        rsync_save_jobs();
+        EXPECT_EQ(entries(), one.left);
+        EXPECT_EQ(groups(), one.groups);
+        EXPECT_EQ(committed(), one.committed) << one.left;
+    }
+}
+
+TEST_F(Schedule, RemovingAJobsEntryTakesTheFirstThatHoldsItsName)
+{
+    set_entries({"-r 'x'", "-r 'abc'", "-r 'ab'"});
+    rsync_remove_job_schedule("ab");
+    EXPECT_EQ(entries(), "-r 'x'|-r 'ab'|");
+    EXPECT_TRUE(committed());
+
+    SetUp();
+    set_entries({"-r 'abc'"});
+    rsync_remove_job_schedule("ab");
+    EXPECT_EQ(groups(), "2:first,last,(none)");
+    EXPECT_TRUE(committed());
+
+    SetUp();
+    set_entries({"-r 'x'", "-r 'y'"});
+    rsync_remove_job_schedule("ab");
+    EXPECT_EQ(entries(), "-r 'x'|-r 'y'|");
+    EXPECT_FALSE(committed());
+}
+
+TEST_F(Schedule, AnEntryIsCreatedForTheSchedulerAndTheGroupDeleted)
+{
+    rsync_create_schedule("5", "2", "*", "*", "1", "root", "/usr/sbin/bakjob -r '100%'");
+    rsync_create_schedule("6", "2", "*", "*", "1", "root", "/usr/sbin/bakjob -r 'b'");
+    EXPECT_EQ(entries(), "/usr/sbin/bakjob -r '100%'|/usr/sbin/bakjob -r 'b'|");
+    EXPECT_NE(read_file("/etc/cron.d/device_scheduler").find("5 2 * * 1 root /usr/sbin/bakjob -r '100\\%'\n"),
+              std::string::npos);
+    rsync_delete_schedule();
+    EXPECT_EQ(entries(), "");
+    EXPECT_EQ(read_file("/etc/cron.d/device_scheduler").find("bakjob -r"), std::string::npos);
+}
