@@ -1,0 +1,78 @@
+#include "remote/daemon_config.h"
+
+#include "common/debug_log.h"
+#include "common/private_file.h"
+#include "common/shell.h"
+#include "common/shell_text.h"
+#include "common/text.h"
+#include "config/current_job.h"
+#include "remote/ssh_login.h"
+
+#include <cstdio>
+#include <fcntl.h>
+#include <unistd.h>
+
+namespace bakjob
+{
+
+namespace
+{
+
+constexpr std::string_view PATH_KEY = "path = ";
+constexpr int MOST_TESTS = 10;
+
+bool wait_for_file(const std::string &path)
+{
+    sleep(1);
+    for (int test = 0; test < MOST_TESTS; ++test) {
+        if (access(path.c_str(), F_OK) == 0) return true;
+        sleep(1);
+    }
+    return false;
+}
+
+} // namespace
+
+std::optional<std::string> section_name(std::string_view line)
+{
+    constexpr std::size_t NAME_STARTS = 2;
+    if (!contains(line, "[") || contains(line, PATH_KEY)) return std::nullopt;
+    const std::size_t bracket = line.rfind(']');
+    if (bracket == std::string_view::npos || bracket < NAME_STARTS + 1) return std::nullopt;
+    return std::string(line.substr(NAME_STARTS, bracket - 1 - NAME_STARTS));
+}
+
+std::optional<std::string> path_of_line(std::string_view line)
+{
+    if (!contains(line, PATH_KEY)) return std::nullopt;
+    return std::string(line.substr(PATH_KEY.size()));
+}
+
+bool read_daemon_config(const std::string &local_copy, const std::function<bool(const std::string &)> &line)
+{
+    UniqueFd opened = open_own_file(local_copy, O_RDONLY);
+    const UniqueFile file(opened ? fdopen(opened.get(), "r") : nullptr);
+    if (!file) return false;
+    opened.release();
+    char buffer[1024];
+    while (std::fgets(buffer, sizeof buffer, file.get()) != nullptr) {
+        trim_right(buffer);
+        if (!line(buffer)) break;
+    }
+    return true;
+}
+
+bool fetch_daemon_config(const std::string &local_copy)
+{
+    const auto command =
+        ssh_command(CurrentJob, SshLogin::as_client, "cat /etc/rsyncd.conf > " + shell_word(local_copy));
+    if (!command) return false;
+    // The shell would write through a link of that name: with a file of ours in place nobody else can put
+    // one.
+    if (!replace_file(local_copy, 0600, "")) return false;
+    DebugLog("[%s]\n", command->c_str());
+    run_shell(*command);
+    return wait_for_file(local_copy);
+}
+
+} // namespace bakjob

@@ -1,0 +1,25 @@
+#pragma once
+
+// Proves that the remote host accepts an ssh login without asking, by running the harmless "ls /" there.
+
+#include "config/job.h"
+
+#include <cstdint>
+
+namespace bakjob
+{
+
+enum SshTestResult : std::int32_t {
+    SSH_OK = 1,
+    SSH_FAILED = 2, // no host, a refused value, an empty reply, or a host key that stays changed
+    SSH_NO_ROUTE = 3,
+    SSH_REFUSED = 4,
+    SSH_DENIED = 5,
+    SSH_TIMED_OUT = 7
+};
+
+// Tests the login of CurrentJob. When the host's key has changed, the stored key is removed and the login is
+// tried once more.
+SshTestResult ssh_test();
+
+} // namespace bakjob

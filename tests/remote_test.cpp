@@ -1,0 +1,242 @@
+#include "common/shell.h"
+#include "common/text.h"
+#include "config/current_job.h"
+#include "remote/daemon_config.h"
+#include "remote/daemon_test.h"
+#include "remote/remote_dir.h"
+#include "remote/ssh_login.h"
+#include "remote/ssh_test.h"
+#include "support.h"
+
+#include <unistd.h>
+
+using namespace bakjob;
+
+namespace
+{
+
+// Answers with the next block of /tmp/replies (split at lines "--") and records its arguments.
+constexpr const char *REPLYING =
+    "printf '%s|' \"$@\" >>/tmp/calls; echo >>/tmp/calls\n"
+    "n=$(cat /tmp/n 2>/dev/null || echo 0); echo $((n + 1)) >/tmp/n\n"
+    "awk -v want=\"$n\" '/^--$/ { block++; next } block == want' /tmp/replies >&2\n";
+
+} // namespace
+
+class Remote : public Appliance
+{
+protected:
+    void SetUp() override
+    {
+        Appliance::SetUp();
+        CurrentJob = make_job("daily");
+        copy_text(CurrentJob.ssh_user, "me");
+    }
+};
+
+TEST_F(Remote, RepliesAreJudgedByTheFirstFragmentInOrder)
+{
+    const std::map<std::string, RemoteReplyCode> cases = {
+        {"", REPLY_OK},
+        {"ls:no blank", REPLY_OK},
+        {"connection refused", REPLY_OK},
+        {"rsync: failed to connect: No route to host (113)", REPLY_NO_ROUTE},
+        {"rsync: Connection refused (111)", REPLY_REFUSED},
+        {"ERROR: module is read only: No such file or directory", REPLY_READ_ONLY},
+        {"rsync: change_dir: No such file or directory (2)", REPLY_NO_DIR},
+        {"ls: cannot access", REPLY_NO_DIR},
+        {"x: Not a directory", REPLY_NO_DIR},
+        {"@ERROR: chdir failed", REPLY_NO_DIR},
+        {"@ERROR: Unknown module 'x'", REPLY_UNKNOWN_MODULE},
+        {"@ERROR: auth failed on module x", REPLY_AUTH_FAILED},
+        {"ERROR: auth failed on module x", REPLY_AUTH_FAILED},
+        {"getaddrinfo: No address associated with hostname", REPLY_NO_ADDRESS},
+        {"getaddrinfo: x: Name or service not known", REPLY_HOST_UNREACHABLE},
+        {"Connection timed out", REPLY_HOST_UNREACHABLE},
+        {"@ERROR: max connections", REPLY_ERROR},
+    };
+    for (const auto &[line, code] : cases)
+        EXPECT_EQ(classify_reply_line(line), code) << line;
+    EXPECT_EQ(rsync_classify_reply("echo fine; echo ERROR: late"), REPLY_OK);
+    EXPECT_EQ(rsync_classify_reply("echo ERROR: early; exit 0"), REPLY_ERROR);
+    EXPECT_EQ(rsync_classify_reply(std::string(COMMAND_SIZE, ' ')), REPLY_ERROR);
+}
+
+TEST_F(Remote, DaemonProbesAreExact)
+{
+    const std::vector<std::pair<std::string, std::string>> hosts = {
+        {"10.0.0.1", "10.0.0.1"}, {"fe80::1", "[fe80::1%egiga0]"}, {"2001:db8::1", "[2001:db8::1]"}};
+    for (const auto &[ip, host] : hosts) {
+        const std::string six = host == ip ? "" : "6";
+        RsyncJob job = make_job("daily");
+        copy_text(job.remote_ip, ip);
+        copy_text(job.remote_path, "m/a b");
+        copy_text(job.port, "8730");
+        copy_text(job.rsync_pwd_file, "/elsewhere");
+        job.server_type = 1;
+        EXPECT_EQ(module_list_command(job), "/usr/sbin/rsync  -8" + six + " " + host + ":: 2>&1");
+        const std::string head = "/usr/sbin/rsync  -a8" + six + " --dry-run ";
+        const std::string file = "--password-file=\"/tmp/r_daily.passwd\" ";
+        for (const int backup_type : {1, 2, 3}) {
+            for (const int direction : {0, 1}) {
+                job.backup_type = backup_type;
+                const bool pull = backup_type == 2 && direction == 0;
+                job.rsync_mode = 2;
+                EXPECT_EQ(write_test_command(job, direction),
+                          head + file +
+                              (pull ? "bk@" + host + "::m/a\\ b /tmp 2>&1"
+                                    : "'/etc/hosts' bk@" + host + "::m/a\\ b 2>&1"));
+                job.rsync_mode = 1;
+                EXPECT_EQ(write_test_command(job, direction),
+                          head + (pull ? "bk@" + host + ":m/a\\ b /tmp 2>&1"
+                                       : "/etc/hosts bk@" + host + ":m/a\\ b 2>&1"));
+            }
+        }
+    }
+    CurrentJob.remote_ip[0] = '\0';
+    EXPECT_EQ(rsync_daemon_test(), REPLY_ERROR);
+    EXPECT_EQ(rsync_write_test(0), REPLY_ERROR);
+}
+
+TEST_F(Remote, SshCommandsFollowLoginAndAddress)
+{
+    struct Case {
+        SshLogin login;
+        const char *password;
+        const char *ip;
+        std::string command;
+    };
+    const auto client = SshLogin::as_client;
+    const auto user = SshLogin::as_user;
+    const std::vector<Case> cases = {
+        {client, "", "10.0.0.1", "/usr/sbin/ssh  10.0.0.1 ls /"},
+        {client, "", "fe80::1", "/usr/sbin/ssh  -6 fe80::1%egiga0 ls /"},
+        {client, "", "::1", "/usr/sbin/ssh  -6 ::1 ls /"},
+        {client, "cHc=", "10.0.0.1", "/usr/sbin/ssh -d 'cHc=' 10.0.0.1 ls /"},
+        {client, "cHc=", "fe80::1", "/usr/sbin/ssh -d 'cHc=' -6 fe80::1%egiga0 ls /"},
+        {client, "cHc=", "::1", "/usr/sbin/ssh -d 'cHc=' -6 ::1 ls /"},
+        {user, "", "10.0.0.1", "/usr/sbin/ssh me@10.0.0.1 ls /"},
+        {user, "", "fe80::1", "/usr/sbin/ssh -6 me@fe80::1%egiga0 ls /"},
+        {user, "", "::1", "/usr/sbin/ssh -6 me@::1 ls /"},
+        {user, "cHc=", "10.0.0.1", "/usr/sbin/ssh -d 'cHc=' me@10.0.0.1 ls /"},
+        {user, "cHc=", "fe80::1", "/usr/sbin/ssh -6 -d 'cHc=' me@fe80::1%egiga0 ls /"},
+        {user, "cHc=", "::1", "/usr/sbin/ssh -6 -d 'cHc=' me@::1 ls /"},
+    };
+    for (const Case &one : cases) {
+        copy_text(CurrentJob.ssh_pwd, one.password);
+        copy_text(CurrentJob.remote_ip, one.ip);
+        EXPECT_EQ(ssh_command(CurrentJob, one.login, "ls /"), one.command);
+    }
+    CurrentJob.pwd_encoded = 0;
+    copy_text(CurrentJob.ssh_pwd, "plain");
+    EXPECT_EQ(ssh_password(CurrentJob), "cGxhaW4=");
+    copy_text(CurrentJob.ssh_pwd, std::string(94, 'x'));
+    EXPECT_FALSE(ssh_command(CurrentJob, client, "ls /"));
+    CurrentJob.pwd_encoded = 1;
+    copy_text(CurrentJob.ssh_pwd, "a' b");
+    EXPECT_FALSE(ssh_command(CurrentJob, client, "ls /"));
+    CurrentJob.ssh_pwd[0] = '\0';
+    EXPECT_FALSE(ssh_command(CurrentJob, client, std::string(COMMAND_SIZE, 'x')));
+    copy_text(CurrentJob.ssh_user, "-oProxyCommand=x");
+    EXPECT_FALSE(ssh_command(CurrentJob, user, "ls /"));
+}
+
+TEST_F(Remote, SshTestRepairsAChangedHostKeyOnce)
+{
+    const std::string changed = std::string(58, '@') + "\nWARNING\n";
+    struct Case {
+        std::string replies;
+        SshTestResult result;
+        int logins;
+        int resets;
+    };
+    const std::vector<Case> cases = {
+        {"bin\netc\n", SSH_OK, 1, 0},
+        {"", SSH_FAILED, 1, 0},
+        {"\nlater\n", SSH_FAILED, 1, 0},
+        {"ssh: No route to host\n", SSH_NO_ROUTE, 1, 0},
+        {"ssh: Connection refused\n", SSH_REFUSED, 1, 0},
+        {"me: Permission denied " + changed, SSH_DENIED, 1, 0},
+        {"ssh: Connection timed out\n", SSH_TIMED_OUT, 1, 0},
+        {std::string(27, '@') + "\n", SSH_OK, 1, 0},
+        {changed + "--\nbin\n", SSH_OK, 2, 1},
+        {changed + "--\n" + changed, SSH_FAILED, 2, 1},
+        {changed + "--\nConnection timed out\n", SSH_TIMED_OUT, 2, 1},
+        {changed + "--\nPermission denied\n", SSH_DENIED, 2, 1},
+        {changed + "--\n", SSH_FAILED, 2, 1},
+    };
+    const Fake ssh("/usr/sbin/ssh", REPLYING);
+    const Fake keygen("/usr/sbin/ssh-keygen", "echo \"$@\" >>/tmp/resets\n");
+    copy_text(CurrentJob.remote_ip, "fe80::1");
+    for (const Case &one : cases) {
+        for (const char *file : {"/tmp/n", "/tmp/calls", "/tmp/resets"})
+            unlink(file);
+        write_file("/tmp/replies", one.replies);
+        EXPECT_EQ(ssh_test(), one.result) << one.replies;
+        EXPECT_EQ(lines_of(read_file("/tmp/calls")).size(), static_cast<std::size_t>(one.logins))
+            << one.replies;
+        EXPECT_EQ(read_file("/tmp/resets"), one.resets == 0 ? "" : "-R fe80::1%egiga0\n");
+    }
+    unlink("/tmp/calls");
+    CurrentJob.server_type = 3;
+    EXPECT_EQ(ssh_test(), SSH_FAILED);
+    EXPECT_FALSE(exists("/tmp/calls"));
+}
+
+TEST_F(Remote, DaemonConfigurationIsReadByItsLayout)
+{
+    const std::map<std::string, std::string> headers = {{"[ backup ]", "backup"},
+                                                        {"[ my photos ]", "my photos"},
+                                                        {"[ a ] b ]", "a ] b"},
+                                                        {"[backup]", "acku"},
+                                                        {"[ path = x ]", "(none)"},
+                                                        {"no brackets", "(none)"},
+                                                        {"]", "(none)"},
+                                                        {"[]", "(none)"},
+                                                        {"[ ]", "(none)"},
+                                                        {"[  ]", ""},
+                                                        {"x]", "(none)"}};
+    for (const auto &[line, name] : headers)
+        EXPECT_EQ(section_name(line).value_or("(none)"), name) << line;
+    EXPECT_EQ(path_of_line("path = /mnt/HD/x"), "/mnt/HD/x");
+    EXPECT_EQ(path_of_line("  path = /x"), "= /x") << "path lines begin at the first column";
+    EXPECT_FALSE(path_of_line("paths=/x"));
+}
+
+TEST_F(Remote, AMissingFolderIsMadeBelowTheModulesOwn)
+{
+    struct Case {
+        std::string config;
+        std::string first;
+        std::string second;
+        std::string remote_command; // as ssh gets it; empty: none
+    };
+    const std::vector<Case> cases = {
+        {"[ other ]\npath = /o\n[ backup ]\ncomment = x\npath = /mnt/HD/HD_a2/backup\n",
+         "S123_remote_backup/job1/Public", "docs",
+         "(cd /mnt/HD/HD_a2/backup;umask 000 ;mkdir  -p S123_remote_backup/job1/Public/docs)"},
+        {"[ backup ]\n[ x ]\npath = /m\n", "s/j/P", "", "(cd /m;umask 000 ;mkdir  -p s/j/P/)"},
+        {"[ backup ]\npath = /it's $HOME\n", "s", "it's #1 `x`",
+         "(cd /it\\'s\\ \\$HOME;umask 000 ;mkdir  -p s/it\\'s\\ \\#1\\ \\`x\\`)"},
+        {"[ Backup ]\npath = /m\n[backup]\npath = /m\n", "s", "x", ""},
+        {"[ backup ]\n", "s", "x", ""},
+        {"", "s", "x", ""},
+        {"[ backup ]\npath = /m\";touch /tmp/pwned;\"\n", "s", "x", ""},
+        {"[ backup ]\npath = relative\n", "s", "x", ""},
+        {"[ backup ]\npath = /m\n", "-rf", "x", ""},
+        {"[ backup ]\npath = /m\n", "s", std::string(1100, 'x'), ""},
+    };
+    const Fake ssh("/usr/sbin/ssh",
+                   "for last; do :; done\ncase $* in\n*'cat /etc/rsyncd.conf') cat /tmp/config ;;\n"
+                   "*) printf '%s' \"$last\" >/tmp/command; exit 7 ;;\nesac\n");
+    for (const Case &one : cases) {
+        write_file("/tmp/config", one.config);
+        write_file("/tmp/remote_rshareinfo_it's.txt", "old");
+        unlink("/tmp/command");
+        EXPECT_EQ(rsync_prepare_remote_dir("it's", "backup", one.first, one.second),
+                  one.remote_command.empty() ? -1 : 7);
+        EXPECT_EQ(read_file("/tmp/command"), one.remote_command);
+        EXPECT_FALSE(exists("/tmp/remote_rshareinfo_it's.txt"));
+    }
+    EXPECT_FALSE(exists("/tmp/pwned"));
+}
