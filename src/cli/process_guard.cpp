@@ -1,0 +1,91 @@
+#include "cli/process_guard.h"
+
+#include "common/debug_log.h"
+#include "common/job_files.h"
+#include "common/private_file.h"
+#include "common/run_options.h"
+#include "common/shell.h"
+#include "common/shell_text.h"
+#include "common/text.h"
+
+#include <cerrno>
+#include <charconv>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace bakjob
+{
+
+namespace
+{
+
+// The file's text becomes the argument of a kill as root: it has to be one process id and nothing else.
+bool holds_process_id(const std::string &path)
+{
+    const UniqueFd file = open_own_file(path, O_RDONLY);
+    char text[32] = "";
+    if (!file || read(file.get(), text, sizeof text - 1) <= 0) return false;
+    const std::string_view content(text);
+    pid_t pid = 0;
+    const auto [end, error] = std::from_chars(content.data(), content.data() + content.size(), pid);
+    return error == std::errc() && pid > 0 && std::string_view(end) == "\n";
+}
+
+} // namespace
+
+bool rsync_pid_file_absent(const std::string &job_name)
+{
+    struct stat status {
+    };
+    return lstat(pid_file(job_name).c_str(), &status) != 0;
+}
+
+bool rsync_write_pid_file(const std::string &job_name)
+{
+    const std::string path = pid_file(job_name);
+    const UniqueFd file = create_file(path, 0644);
+    if (!file) return false;
+    if (write_all(file.get(), format_text("%d\n", getpid()))) return true;
+    const int why = errno;
+    unlink(path.c_str());
+    errno = why;
+    return false;
+}
+
+int rsync_remove_pid_file(const std::string &job_name)
+{
+    return unlink(pid_file(job_name).c_str());
+}
+
+std::string rsync_ps_command()
+{
+    return run_shell("ps -ww >/dev/null 2>&1") == 0 ? "ps -ww" : "ps";
+}
+
+int rsync_kill_job_process(const std::string &job_name)
+{
+    if (rsync_pid_file_absent(job_name)) return -1;
+    const std::string path = pid_file(job_name);
+    if (!holds_process_id(path)) {
+        DebugLog("ERROR: no process id in [%s]\n", path.c_str());
+        return -1;
+    }
+    const std::string ps = rsync_ps_command();
+    const std::string file = in_backquotes(shell_word(path));
+    const std::string is_restore =
+        format_text("%s | grep `cat %s`'' | grep -- ' -i ' | grep -v '%s'  >/dev/null 2>&1", ps.c_str(),
+                    file.c_str(), ps.c_str());
+    if (run_shell(is_restore) == 0) run_options.restore_mode = 1;
+    return run_shell(format_text("kill -9 `cat %s`", file.c_str()));
+}
+
+void rsync_kill_transfers(const std::string &job_name)
+{
+    const std::string ps = rsync_ps_command();
+    run_shell(format_text("kill -9 `%s | grep /usr/sbin/rsync | grep job-name=%s | grep -v '%s' "
+                          "| awk '{ print $1 }'`  >/dev/null 2>&1",
+                          ps.c_str(), in_backquotes(grep_word(job_name)).c_str(), ps.c_str()));
+}
+
+} // namespace bakjob

@@ -1,0 +1,191 @@
+#include "cli/run_job.h"
+
+#include "cli/job_state.h"
+#include "cli/process_guard.h"
+#include "cli/recover_list.h"
+#include "cli/source_folders.h"
+#include "common/debug_log.h"
+#include "common/job_files.h"
+#include "common/run_options.h"
+#include "common/shell_text.h"
+#include "config/job_list.h"
+#include "config/job_store.h"
+#include "platform/config_store.h"
+#include "platform/device.h"
+#include "transfer/backup.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <optional>
+
+namespace bakjob
+{
+
+namespace
+{
+
+constexpr int ALERT_LEVEL = 1;
+constexpr std::size_t VOLUME_PREFIX_LENGTH = 14; // of "/mnt/HD/HD_a2/"
+
+bool is_restore_run()
+{
+    return run_options.restore_mode == 1;
+}
+
+std::optional<RsyncJob> load_enabled_job(const std::string &job_name)
+{
+    std::optional<RsyncJob> copy;
+    if (is_job_name(job_name)) {
+        rsync_load_jobs();
+        const RsyncJob *const job = rsync_find_job(job_name);
+        if (job != nullptr && job->enable != 0) rsync_copy_job(copy.emplace(), *job);
+        rsync_free_jobs();
+    }
+    if (!copy) DebugLog("ERROR: not found this job_name [%s] or disabled\n", job_name.c_str());
+    return copy;
+}
+
+// Silent refusals: nobody asked for this run now, or there is nothing to recover from.
+bool is_due(const RsyncJob &job, bool force)
+{
+    if (job.schedule_mode == SCHEDULE_ONCE && job.state != JOB_IDLE && !force) return false;
+    if (run_options.recover_seq == 0) return true;
+    return job.inc_enable == 1 && rsync_list_snapshots(job.job_name) != 0;
+}
+
+bool take_pid_file(const std::string &job_name)
+{
+    if (rsync_write_pid_file(job_name)) return true;
+    if (errno == EEXIST) {
+        DebugLog("ERROR: rsync backup is running!\n");
+    } else {
+        DebugLog("ERROR: pid file [%s]: %s\n", pid_file(job_name).c_str(), std::strerror(errno));
+    }
+    return false;
+}
+
+std::string remote_backup_root(const std::string &job_name)
+{
+    char serial[SERIAL_SIZE] = "";
+    rsync_read_serial(serial);
+    if (std::strpbrk(serial, "\r\n") != nullptr) {
+        DebugLog("ERROR: line break in the serial text of [%s]: no remote folder can be named\n",
+                 SERIAL_FILE);
+    }
+    return format_text("/%s_remote_backup/%s", serial, job_name.c_str());
+}
+
+void raise_alert(const RsyncJob &job, bool done)
+{
+    rsync_alert_text(job);
+    const int success = is_restore_run() ? ALERT_RESTORE_DONE : ALERT_FOLDER_DONE;
+    const int failure = is_restore_run() ? ALERT_RESTORE_FAILED : ALERT_FOLDER_FAILED;
+    fireAlert(ALERT_LEVEL, done ? success : failure, run_options.alert_text);
+}
+
+// Points the job at the resolved folder's two ends. False when the remote one does not fit.
+bool set_ends(RsyncJob &job, const std::string &folder)
+{
+    std::string remote_path = std::string(job.remote_path) + share_remote_dir;
+    if (is_restore_run()) {
+        copy_text(job.local_path, share_path);
+    } else {
+        remote_path += folder.substr(std::strlen(share_path));
+    }
+    if (copy_text(job.remote_path, remote_path)) return true;
+    DebugLog("ERROR: remote_path refused: too long\n");
+    return false;
+}
+
+struct FolderPlace {
+    std::string folder;
+    int index; // from 1
+    int count;
+};
+
+// `job` is a copy for this folder alone.
+bool run_folder(RsyncJob job, const std::string &job_name, const std::string &root, const FolderPlace &place)
+{
+    copy_text(job.local_path, place.folder);
+    bool done = rsync_resolve_folder(root, place.folder) == 0;
+    if (done) {
+        rsync_write_progress(job_name, place.folder, place.index, place.count);
+        done = set_ends(job, place.folder) && rsync_run_backup(job_name, job) == BACKUP_DONE;
+    }
+    raise_alert(job, done);
+    return done;
+}
+
+bool run_folders(const RsyncJob &job, const std::string &job_name)
+{
+    const std::string root = remote_backup_root(job_name);
+    RsyncJob to_split = job;
+    FolderTable folders{};
+    rsync_split_folders(to_split, folders);
+    bool all_done = true;
+    for (int i = 0; i < folders.count; ++i) {
+        all_done &= run_folder(job, job_name, root, {folders.entries[i], i + 1, folders.count});
+    }
+    if (folders.left_out > 0) {
+        DebugLog("ERROR: local_path refused: %d folders too many or too long\n", folders.left_out);
+        raise_alert(job, false);
+        all_done = false;
+    }
+    return all_done;
+}
+
+JobState final_state(const RsyncJob &job, bool outcome)
+{
+    if (outcome) return job.schedule_mode == SCHEDULE_EVENT ? JOB_DONE_SCHEDULED : JOB_DONE;
+    return run_options.recover_seq != 0 ? JOB_RECOVER_FAILED : JOB_FAILED;
+}
+
+} // namespace
+
+void rsync_alert_text(const RsyncJob &job)
+{
+    char device[128] = "";
+    xml_get_str("/system_mgr/samba/netbios_name", sizeof device, device);
+    std::string_view place = job.remote_path;
+    if (job.backup_type == BACKUP_PULL) {
+        place = job.local_path;
+        place.remove_prefix(std::min(place.size(), VOLUME_PREFIX_LENGTH));
+    }
+    std::snprintf(run_options.alert_text, sizeof run_options.alert_text, "%s,%s,%s", job.job_name, device,
+                  place.data());
+}
+
+bool rsync_run_job(const std::string &job_name, bool force, bool &outcome)
+{
+    if (is_job_name(job_name) && !rsync_pid_file_absent(job_name)) {
+        DebugLog("ERROR: rsync backup is running!\n");
+        return false;
+    }
+    auto job = load_enabled_job(job_name);
+    if (!job || !is_due(*job, force)) return false;
+    if (is_restore_run()) job->backup_type = BACKUP_PULL;
+    if (!take_pid_file(job_name)) return false;
+
+    rsync_set_job_state(job_name, JOB_STARTING);
+    if (!run_folders(*job, job_name)) outcome = false;
+    rsync_set_job_state(job_name, final_state(*job, outcome));
+    rsync_remove_pid_file(job_name);
+    return true;
+}
+
+void rsync_kill_job(const std::string &job_name)
+{
+    if (!is_job_name(job_name)) {
+        DebugLog("ERROR: job name refused: [%s]\n", job_name.c_str());
+        return;
+    }
+    if (rsync_kill_job_process(job_name) == 0) std::puts("kill rsync job success .....");
+    rsync_kill_transfers(job_name);
+    rsync_set_job_state(job_name, JOB_KILLED);
+    rsync_remove_progress(job_name);
+    rsync_remove_pid_file(job_name);
+}
+
+} // namespace bakjob

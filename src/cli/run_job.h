@@ -1,0 +1,30 @@
+#pragma once
+
+// What -r and -k do: one whole run of a job, folder by folder, and its end on request.
+
+#include "config/job.h"
+
+#include <string>
+
+namespace bakjob
+{
+
+enum AlertCode : int {
+    ALERT_FOLDER_FAILED = 1400,
+    ALERT_RESTORE_FAILED = 1401,
+    ALERT_FOLDER_DONE = 2402,
+    ALERT_RESTORE_DONE = 2403
+};
+
+// Runs the job: blocks until its last folder. `force` runs a job again that runs only once; `outcome` is
+// cleared when a folder fails, and never set. False when the run was refused: then nothing was changed.
+bool rsync_run_job(const std::string &job_name, bool force, bool &outcome);
+
+// Kills the job's process and its transfers, and records that it was killed.
+void rsync_kill_job(const std::string &job_name);
+
+// Builds `alert_text` for the job as it stands: name, name of the device, and the folder's place. A text that
+// does not fit is cut.
+void rsync_alert_text(const RsyncJob &job);
+
+} // namespace bakjob

@@ -1,0 +1,137 @@
+#include "cli/source_folders.h"
+
+#include "common/debug_log.h"
+#include "common/handles.h"
+#include "common/job_files.h"
+#include "common/private_file.h"
+#include "platform/device.h"
+
+#include <cstdio>
+#include <cstring>
+#include <fcntl.h>
+#include <string_view>
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace bakjob
+{
+
+char share_remote_dir[PATH_SIZE];
+char share_path[PATH_SIZE];
+char share_subdir[PATH_SIZE];
+
+namespace
+{
+
+// Byte offsets that the share library promises. Records are not aligned for pointers.
+constexpr std::size_t FIRST_SHARE = 49016;
+constexpr std::size_t SHARE_NAME = 516;
+constexpr std::size_t SHARE_PATH = 2052;
+constexpr std::size_t NEXT_SHARE = 55348;
+
+const char *pointer_at(const char *block, std::size_t offset)
+{
+    const char *pointer = nullptr;
+    std::memcpy(&pointer, block + offset, sizeof pointer);
+    return pointer;
+}
+
+class ShareTable
+{
+public:
+    ShareTable() { get_samba_info(); }
+    ShareTable(const ShareTable &) = delete;
+    ShareTable &operator=(const ShareTable &) = delete;
+    ~ShareTable() { Free_All_List(); }
+
+    // The first share that holds the folder, or null.
+    [[nodiscard]] const char *holding(const std::string &folder) const
+    {
+        const char *share = pss == nullptr ? nullptr : pointer_at(pss, FIRST_SHARE);
+        while (share != nullptr) {
+            const std::string path = share + SHARE_PATH;
+            if (folder == path || folder.starts_with(path + '/')) break;
+            share = pointer_at(share, NEXT_SHARE);
+        }
+        return share;
+    }
+};
+
+bool is_directory(const std::string &path)
+{
+    struct stat status {
+    };
+    return lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
+}
+
+// What looks like a folder below a share may then lie anywhere.
+bool leaves_share(const std::string &folder)
+{
+    return (folder + '/').find("/../") != std::string::npos;
+}
+
+// The folder's place below its share; for a file, that of the folder that holds it.
+std::string place_below(const std::string &share, const std::string &folder)
+{
+    std::string place = folder.substr(share.size());
+    if (!place.empty() && !is_directory(folder)) place.resize(place.rfind('/'));
+    return place.empty() ? "/" : place;
+}
+
+bool fill_buffers(const std::string &remote_backup_root, const char *share, const std::string &folder)
+{
+    return copy_text(share_remote_dir, remote_backup_root + '/' + (share + SHARE_NAME)) &&
+           copy_text(share_path, share + SHARE_PATH) &&
+           copy_text(share_subdir, place_below(share + SHARE_PATH, folder));
+}
+
+} // namespace
+
+void rsync_split_folders(RsyncJob &job, FolderTable &table)
+{
+    const bool maybe_cut = std::strlen(job.local_path) == sizeof job.local_path - 1;
+    if (maybe_cut) {
+        char *const last = std::strrchr(job.local_path, ':');
+        (last == nullptr ? job.local_path[0] : *last) = '\0';
+    }
+    rsync_split_list(job.local_path, ":", table);
+    if (maybe_cut) ++table.left_out;
+}
+
+int rsync_resolve_folder(const std::string &remote_backup_root, const std::string &folder)
+{
+    share_remote_dir[0] = share_path[0] = share_subdir[0] = '\0';
+    const ShareTable shares;
+    if (leaves_share(folder)) {
+        DebugLog("ERROR: local_path refused: [%s] has a \"..\" step\n", folder.c_str());
+        return -1;
+    }
+    const char *const share = shares.holding(folder);
+    if (share == nullptr || !fill_buffers(remote_backup_root, share, folder)) return -1;
+    return chdir(share_path);
+}
+
+void rsync_write_progress(const std::string &job_name, const std::string &folder, int index, int count)
+{
+    if (folder.empty()) return;
+    replace_file(progress_file(job_name), 0644, format_text("%s\n%d/%d\n", folder.c_str(), index, count));
+}
+
+void rsync_remove_progress(const std::string &job_name)
+{
+    unlink(progress_file(job_name).c_str());
+}
+
+int rsync_read_serial(char (&serial)[SERIAL_SIZE])
+{
+    // Not waiting: anybody may have put a pipe of that name there.
+    UniqueFd opened(open(SERIAL_FILE, O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+    const UniqueFile file(opened ? fdopen(opened.get(), "r") : nullptr);
+    if (!file) return -1;
+    opened.release();
+    serial[0] = '\0';
+    if (std::fgets(serial, sizeof serial, file.get()) == nullptr) serial[0] = '\0';
+    return 0;
+}
+
+} // namespace bakjob

@@ -1,0 +1,41 @@
+#pragma once
+
+// From a job's source folders to their place on the remote side: which network share holds a folder, where
+// its data lives remotely, and which folder of how many is being transferred. Remotely a job's data lies
+// below its `remote_path` in SERIAL_remote_backup/JOB/SHARE/FOLDER.
+
+#include "common/folder_table.h"
+#include "common/text.h"
+#include "config/job.h"
+
+#include <cstddef>
+#include <string>
+
+namespace bakjob
+{
+
+// Filled by rsync_resolve_folder.
+extern char share_remote_dir[PATH_SIZE]; // the backup root and the share's name
+extern char share_path[PATH_SIZE];       // the share's folder on this device
+extern char share_subdir[PATH_SIZE];     // the folder's place below the share: "/" for the share itself
+
+inline constexpr std::size_t SERIAL_SIZE = 128;
+
+// Splits the job's `local_path` into the table, in place. Folders that the table cannot hold, and a last one
+// that the store may have cut, are counted as left out.
+void rsync_split_folders(RsyncJob &job, FolderTable &table);
+
+// Finds the first share that holds the folder, fills the three buffers and changes the working directory to
+// the share's path. -1 when no share holds it, it has a ".." step, a text does not fit, or the share's path
+// cannot be entered.
+int rsync_resolve_folder(const std::string &remote_backup_root, const std::string &folder);
+
+// Publishes which folder (`index` from 1 of `count`) is being transferred.
+void rsync_write_progress(const std::string &job_name, const std::string &folder, int index, int count);
+void rsync_remove_progress(const std::string &job_name);
+
+// Reads the device's serial text: the first line of its file, line break included, at most 127 bytes. -1, and
+// the buffer untouched, when the file cannot be opened.
+int rsync_read_serial(char (&serial)[SERIAL_SIZE]);
+
+} // namespace bakjob

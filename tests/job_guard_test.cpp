@@ -1,0 +1,236 @@
+#include "cli/job_state.h"
+#include "cli/process_guard.h"
+#include "cli/recover_list.h"
+#include "common/run_options.h"
+#include "config/config_lock.h"
+#include "config/job_list.h"
+#include "support.h"
+
+#include <cerrno>
+#include <csignal>
+#include <cstring>
+#include <fcntl.h>
+#include <filesystem>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+using namespace bakjob;
+namespace fs = std::filesystem;
+
+class Guard : public Appliance
+{
+};
+
+class State : public Appliance
+{
+};
+
+class RecoverListing : public Appliance
+{
+};
+
+TEST_F(Guard, ThePidFileIsMadeByOneRunAlone)
+{
+    const std::string name = "it's $x";
+    const std::string path = "/var/run/bakjob_it's $x.pid";
+    EXPECT_TRUE(rsync_pid_file_absent(name));
+    EXPECT_TRUE(rsync_write_pid_file(name));
+    EXPECT_EQ(read_file(path), std::to_string(getpid()) + "\n");
+    EXPECT_FALSE(rsync_write_pid_file(name));
+    EXPECT_EQ(errno, EEXIST);
+    EXPECT_EQ(rsync_remove_pid_file(name), 0);
+    EXPECT_EQ(rsync_remove_pid_file(name), -1);
+
+    fs::create_symlink("/tmp/target", path);
+    EXPECT_FALSE(rsync_pid_file_absent(name)) << "a dangling link stands there too";
+    EXPECT_FALSE(rsync_write_pid_file(name));
+    EXPECT_FALSE(exists("/tmp/target"));
+}
+
+TEST_F(Guard, KillingTakesTheProcessInThePidFileAndNothingElse)
+{
+    EXPECT_EQ(rsync_kill_job_process("none"), -1);
+    for (const char *text : {"", "-1\n", "0\n", "12 34\n", "12;touch /tmp/x\n", "99999999999\n"}) {
+        write_file("/var/run/bakjob_bad.pid", text);
+        EXPECT_EQ(rsync_kill_job_process("bad"), -1) << text;
+    }
+    for (const bool restore : {false, true}) {
+        run_options = {};
+        const pid_t victim = fork();
+        if (victim == 0) {
+            execl("/bin/sleep", restore ? "bakjob -i / -r x" : "bakjob -r x", "4711", nullptr);
+        }
+        write_file("/var/run/bakjob_a b.pid", std::to_string(victim) + "\n");
+        usleep(50'000);
+        EXPECT_EQ(rsync_kill_job_process("a b"), 0);
+        int status = 0;
+        ASSERT_EQ(waitpid(victim, &status, 0), victim);
+        EXPECT_TRUE(WIFSIGNALED(status));
+        EXPECT_EQ(run_options.restore_mode, restore ? 1 : 0);
+    }
+}
+
+TEST_F(Guard, TransfersAreFoundByTheirJobsNameTakenLiterally)
+{
+    struct Case {
+        std::string running;
+        std::string killed;
+        bool ends;
+    };
+    const std::vector<Case> cases = {{"daily", "daily", true},     {"daily", "weekly", false},
+                                     {"a.b", "a.b", true},         {"axb", "a.b", false},
+                                     {"it's $x", "it's $x", true}, {"^x$", "^x$", true},
+                                     {"b [1]", "b [1]", true},     {"b 1", "b [1]", false}};
+    for (const Case &one : cases) {
+        const pid_t transfer = fork();
+        if (transfer == 0) {
+            const std::string name = "/usr/sbin/rsync --job-name=" + one.running;
+            execl("/bin/sleep", name.c_str(), "4711", nullptr);
+        }
+        usleep(20'000);
+        rsync_kill_transfers(one.killed);
+        int status = 0;
+        const bool ended =
+            eventually([&] { return waitpid(transfer, &status, WNOHANG) == transfer; }, one.ends ? 5 : 0);
+        EXPECT_EQ(ended, one.ends) << one.running << " " << one.killed;
+        if (!ended) {
+            kill(transfer, SIGKILL);
+            waitpid(transfer, &status, 0);
+        }
+    }
+    const Fake ps("/usr/local/sbin/ps", "[ \"$1\" = -ww ] && exit 1\n");
+    EXPECT_EQ(rsync_ps_command(), "ps");
+}
+
+TEST_F(State, GoesToTheDirectionOfTheRun)
+{
+    add_job({{"job_name", "a"}, {"state", "7"}, {"rstate", "7"}});
+    rsync_set_job_state("a", JOB_RUNNING);
+    EXPECT_EQ(job_key(1, "state") + job_key(1, "rstate"), "37");
+    const std::string time = job_key(1, "last_do_job_time");
+    std::tm parsed{};
+    EXPECT_NE(strptime(time.c_str(), "%a %b %d %Y %I:%M:%S %p", &parsed), nullptr) << time;
+    EXPECT_EQ(read_file("/var/lib/device_flash/config.xml"), read_file("/etc/NAS_CFG/config.xml"));
+    run_options.restore_mode = 1;
+    rsync_set_job_state("a", JOB_FAILED);
+    EXPECT_EQ(job_key(1, "state") + job_key(1, "rstate"), "34");
+    EXPECT_EQ(job_key(1, "last_do_job_time"), time);
+
+    const std::string before = read_file("/etc/NAS_CFG/config.xml");
+    rsync_set_job_state("unknown", JOB_DONE);
+    EXPECT_EQ(read_file("/etc/NAS_CFG/config.xml"), before);
+}
+
+TEST_F(State, OnlyStaleStatesAreReset)
+{
+    const std::vector<std::pair<std::string, std::string>> states = {{"12", "8"},  {"3", "8"},   {"10", "8"},
+                                                                     {"4", "4"},   {"9", "9"},   {"11", "11"},
+                                                                     {"-3", "-3"}, {"13", "13"}, {"0", "0"}};
+    for (const auto &[before, after] : states)
+        add_job({{"job_name", "s" + before}, {"state", before}, {"rstate", before}});
+    add_job({{"job_name", "alive"}, {"state", "3"}, {"rstate", "12"}});
+    write_file("/var/run/bakjob_alive.pid", "1\n");
+    EXPECT_EQ(bakjob_program("-a").status, 0);
+    int item = 0;
+    for (const auto &[before, after] : states) {
+        EXPECT_EQ(job_key(++item, "state"), after);
+        EXPECT_EQ(job_key(item, "rstate"), after);
+        EXPECT_EQ(job_key(item, "last_do_job_time").size() > 20, before != after) << before;
+    }
+    EXPECT_EQ(job_key(10, "state") + job_key(10, "rstate"), "312");
+
+    fs::remove("/var/lib/device_flash/config.xml");
+    const auto written = fs::last_write_time("/etc/NAS_CFG/config.xml");
+    EXPECT_EQ(bakjob_program("-a").status, 0);
+    EXPECT_EQ(fs::last_write_time("/etc/NAS_CFG/config.xml"), written) << "nothing stale, nothing written";
+    EXPECT_FALSE(exists("/var/lib/device_flash/config.xml"));
+}
+
+TEST_F(State, ChangesOfManyProcessesAllArrive)
+{
+    constexpr int PROCESSES = 8;
+    constexpr int CHANGES = 10;
+    for (int i = 1; i <= PROCESSES; ++i)
+        add_job({{"job_name", "j" + std::to_string(i)}, {"state", "0"}});
+    for (int i = 1; i <= PROCESSES; ++i) {
+        if (fork() != 0) continue;
+        for (int n = 1; n <= CHANGES; ++n)
+            rsync_set_job_state("j" + std::to_string(i), static_cast<JobState>(100 * i + n));
+        _exit(0);
+    }
+    while (wait(nullptr) > 0) {
+    }
+    for (int i = 1; i <= PROCESSES; ++i)
+        EXPECT_EQ(job_key(i, "state"), std::to_string(100 * i + CHANGES));
+    EXPECT_EQ(std::distance(fs::directory_iterator("/etc/NAS_CFG"), fs::directory_iterator()), 1);
+}
+
+TEST_F(State, TheLockIsExclusiveAndNobodyElsesFile)
+{
+    const char *const path = "/tmp/lock";
+    {
+        const UniqueFd lock = rsync_lock_config(path);
+        ASSERT_TRUE(lock);
+        const UniqueFd other(open(path, O_RDONLY));
+        EXPECT_NE(flock(other.get(), LOCK_EX | LOCK_NB), 0);
+    }
+    fs::remove(path);
+    write_file("/tmp/victim", "kept");
+    fs::create_symlink("/tmp/victim", path);
+    EXPECT_TRUE(rsync_lock_config(path));
+    EXPECT_EQ(read_file("/tmp/victim"), "kept");
+    EXPECT_EQ(octal_mode(path), "600");
+    fs::remove(path);
+    ASSERT_EQ(mkfifo(path, 0666), 0);
+    EXPECT_TRUE(rsync_lock_config(path)) << "must not wait on a pipe";
+    EXPECT_FALSE(rsync_lock_config("/no/such/folder/lock"));
+}
+
+TEST_F(RecoverListing, NumbersTheSnapshotsInNameOrder)
+{
+    const std::string folder = "/mnt/HD/HD_a2/Public";
+    add_job({{"job_name", "job"}, {"backup_type", "2"}, {"inc_enable", "1"}, {"local_path", folder}});
+    EXPECT_EQ(rsync_list_snapshots("job"), 0) << "no folder";
+    fs::create_directories(folder);
+    EXPECT_EQ(rsync_list_snapshots("job"), 0) << "nothing in it";
+    write_file(folder + "/job.log", "no folder");
+    EXPECT_EQ(rsync_list_snapshots("job"), 1);
+    EXPECT_EQ(recover_list.count, 0);
+    for (const char *name : {"job.x", "job.2", "job.0", "job.1", "jobs.0", "backup.0", ".job.0"})
+        fs::create_directories(folder + "/" + name);
+    run_options.debug_mode = 1;
+    testing::internal::CaptureStdout();
+    EXPECT_EQ(rsync_list_snapshots("job"), 1);
+    const auto trace = lines_of(testing::internal::GetCapturedStdout());
+    ASSERT_EQ(trace.size(), 5U);
+    EXPECT_EQ(trace[4], "scan file num [4]");
+    for (int i = 0; i < 3; ++i) {
+        EXPECT_EQ(recover_list.entries[i].path, folder + "/job." + std::to_string(i));
+        EXPECT_EQ(trace[static_cast<std::size_t>(i)], "[" + std::to_string(i + 1) + ". " +
+                                                          recover_list.entries[i].time + ": " +
+                                                          recover_list.entries[i].path + "]");
+    }
+    for (int i = 3; i < 12; ++i)
+        fs::create_directories(folder + "/job." + std::to_string(i));
+    rsync_list_snapshots("job");
+    EXPECT_EQ(recover_list.count, 10);
+    EXPECT_EQ(recover_list.entries[9].seq, 10);
+}
+
+TEST_F(RecoverListing, TakesOnlyEnabledIncrementalPulls)
+{
+    const std::string folder = "/mnt/HD/HD_a2/Public";
+    fs::create_directories(folder + "/job.0");
+    for (const auto &[key, value] :
+         Keys{{"backup_type", "1"}, {"inc_enable", "0"}, {"enable", "0"}, {"local_path", ""}}) {
+        SetUp();
+        fs::create_directories(folder + "/job.0");
+        Keys keys{{"job_name", "job"}, {"backup_type", "2"}, {"inc_enable", "1"}, {"local_path", folder}};
+        keys[key] = value;
+        add_job(keys);
+        EXPECT_EQ(rsync_list_snapshots("job"), 0) << key;
+        EXPECT_EQ(rsync_job_list_empty(), 1);
+    }
+}

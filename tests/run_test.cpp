@@ -1,0 +1,384 @@
+// Runs of the program with a script in the place of rsync, which records what it was called for and ends as
+// told: the order of steps, retries, states, alerts and refusals.
+
+#include "cli/run_job.h"
+#include "common/run_options.h"
+#include "common/text.h"
+#include "config/current_job.h"
+#include "support.h"
+#include "transfer/backup.h"
+
+#include <algorithm>
+#include <filesystem>
+#include <unistd.h>
+
+using namespace bakjob;
+namespace fs = std::filesystem;
+
+namespace
+{
+
+// Four kinds of call: list (the daemon test), write (the write test), dry and run. The n-th call of a kind
+// prints line n of /tmp/KIND.reply and ends with line n of /tmp/KIND.code, or 0.
+constexpr const char *FAKE_RSYNC = "case $* in\n"
+                                   "*--job-name=*--dry-run*) kind=dry ;;\n*--job-name=*) kind=run "
+                                   ";;\n*--dry-run*) kind=write ;;\n*) kind=list ;;\nesac\n"
+                                   "echo $kind >>/tmp/calls; echo \"$*\" >>/tmp/arguments\n"
+                                   "n=$(grep -c $kind /tmp/calls)\n"
+                                   "sed -n ${n}p /tmp/$kind.reply 2>/dev/null\n"
+                                   "code=$(sed -n ${n}p /tmp/$kind.code 2>/dev/null)\n"
+                                   "[ \"$code\" = KILL ] && kill -9 $$\n"
+                                   "exit ${code:-0}\n";
+
+} // namespace
+
+class Run : public Appliance
+{
+protected:
+    void SetUp() override
+    {
+        Appliance::SetUp();
+        add_share("Public", FOLDER);
+        store_set("/system_mgr/samba/netbios_name", "NAS");
+        store_save();
+        write_file("/tmp/kv_serial.txt", "S1");
+    }
+
+    static void expect_calls(const std::string &calls, const std::string &about = "")
+    {
+        std::string made = read_file("/tmp/calls");
+        std::replace(made.begin(), made.end(), '\n', ' ');
+        EXPECT_EQ(made, calls) << about;
+    }
+
+    // One folder's transfer, as far as the module is called.
+    static BackupResult back_up(RsyncJob job)
+    {
+        copy_text(job.local_path, FOLDER);
+        for (const char *file : {"/tmp/calls", "/tmp/arguments"})
+            unlink(file);
+        return rsync_run_backup("daily", job);
+    }
+
+    static constexpr const char *FOLDER = "/mnt/HD/HD_a2/Public";
+    Fake rsync_{"/usr/sbin/rsync", FAKE_RSYNC};
+};
+
+TEST_F(Run, RetriesAreCounted)
+{
+    struct Case {
+        int retry;
+        std::string dry;
+        std::string run;
+        BackupResult result;
+        std::string calls;
+    };
+    const std::vector<Case> cases = {
+        {0, "", "", BACKUP_DONE, "dry run "},
+        {0, "", "11\n", BACKUP_FAILED, "dry run "},
+        {1, "", "11\n", BACKUP_FAILED, "dry run "},
+        {3, "", "11\n12\n13\n14\n", BACKUP_FAILED, "dry run dry run dry run "},
+        {3, "", "11\n0\n", BACKUP_DONE, "dry run dry run "},
+        {3, "", "23\n", BACKUP_FAILED, "dry run "},
+        {3, "23\n", "0\n", BACKUP_DONE, "dry run "},
+        {3, "10\n10\n10\n10\n", "", BACKUP_FAILED, "dry dry dry "},
+        {0, "10\n", "", BACKUP_FAILED, "dry "},
+        {2, "10\n0\n", "0\n", BACKUP_DONE, "dry dry run "},
+        {2, "", "KILL\n0\n", BACKUP_DONE, "dry run dry run "},
+        {1, "", "KILL\n", BACKUP_FAILED, "dry run "},
+        {2, "KILL\n", "", BACKUP_DONE, "dry dry run "},
+    };
+    add_job({});
+    for (const Case &one : cases) {
+        write_file("/tmp/dry.code", one.dry);
+        write_file("/tmp/run.code", one.run);
+        write_file("/tmp/r_daily.dump_size", "old");
+        RsyncJob job = make_job("daily");
+        job.retry = one.retry;
+        job.retry_interval = 0;
+        EXPECT_EQ(back_up(job), one.result) << one.calls;
+        expect_calls("list write " + one.calls);
+        const bool dry_failed = !one.dry.empty() && !one.dry.starts_with("23");
+        EXPECT_EQ(exists("/tmp/r_daily.dump_size"), !dry_failed) << one.calls;
+    }
+    RsyncJob job = make_job("daily");
+    job.retry = 2;
+    job.retry_interval = 1;
+    write_file("/tmp/run.code", "11\n12\n");
+    const auto start = std::time(nullptr);
+    back_up(job);
+    EXPECT_GE(std::time(nullptr) - start, 1) << "one wait between two transfers";
+}
+
+TEST_F(Run, ProbesDecideWhetherATransferStarts)
+{
+    struct Case {
+        std::string list;
+        std::string write;
+        int backup_type;
+        int rsync_mode;
+        std::string remote_path;
+        int recover;
+        BackupResult result;
+        std::string calls;
+    };
+    const std::string missing = "rsync: No such file or directory\n";
+    const std::string denied = "@ERROR: auth failed on module x\n";
+    const std::vector<Case> cases = {
+        {"Connection refused\n", "", 1, 2, "m/p", 0, BACKUP_REMOTE_FAILED, "list "},
+        {"", denied, 1, 2, "m/p", 0, BACKUP_DONE, "list write dry run "},
+        {"", missing, 2, 2, "m/p", 0, BACKUP_REMOTE_FAILED, "list write "},
+        {"", missing, 1, 2, "m", 0, BACKUP_DONE, "list write dry run "},
+        {"", missing, 1, 1, "/m/p", 0, BACKUP_DONE, "list write dry run "},
+        {"", missing + "\n", 1, 2, "m/p", 0, BACKUP_DONE, "list write write dry run "},
+        {"", missing + missing, 1, 2, "m/p", 0, BACKUP_REMOTE_FAILED, "list write write "},
+        {"Connection refused\n", "", 1, 2, "m/p", 2, BACKUP_DONE, "write dry run "},
+        {"", denied, 2, 2, "m/p", 2, BACKUP_RECOVER_FAILED, "write "},
+        {"", missing, 2, 2, "m/p", 2, BACKUP_RECOVER_FAILED, "write "},
+    };
+    add_job({});
+    for (const Case &one : cases) {
+        write_file("/tmp/list.reply", one.list);
+        write_file("/tmp/write.reply", one.write);
+        run_options.recover_seq = one.recover;
+        RsyncJob job = make_job("daily");
+        copy_text(job.remote_ip, "127.0.0.1");
+        copy_text(job.remote_path, one.remote_path);
+        job.backup_type = one.backup_type;
+        job.rsync_mode = one.rsync_mode;
+        const std::string before = job_key(1, "state");
+        EXPECT_EQ(back_up(job), one.result) << one.calls;
+        expect_calls(one.calls, one.write);
+        const std::string running = one.recover != 0 ? "10" : "3";
+        EXPECT_EQ(job_key(1, "state"), one.result == BACKUP_DONE ? running : before);
+    }
+}
+
+TEST_F(Run, RefusedJobsRunNoTransfer)
+{
+    add_job({});
+    RsyncJob job = make_job("daily");
+    job.server_type = 3;
+    EXPECT_EQ(back_up(job), BACKUP_FAILED);
+    expect_calls("");
+    job = make_job("daily");
+    copy_text(job.remote_ip, "1;reboot");
+    EXPECT_EQ(back_up(job), BACKUP_REMOTE_FAILED);
+    expect_calls("");
+    job = make_job("daily");
+    copy_text(job.remote_path, "m/\"x");
+    EXPECT_EQ(back_up(job), BACKUP_FAILED);
+    expect_calls("list ");
+    job = make_job("daily");
+    copy_text(job.rsync_pwd_file, "/no/such/folder/file");
+    EXPECT_EQ(back_up(job), BACKUP_FAILED);
+    job.rsync_mode = 1;
+    EXPECT_EQ(back_up(job), BACKUP_DONE) << "a remote shell needs no password file";
+    job = make_job("daily");
+    job.use_ssh = 1;
+    const Fake ssh("/usr/sbin/ssh", "echo 'Permission denied'\n");
+    EXPECT_EQ(back_up(job), BACKUP_SSH_FAILED);
+    expect_calls("");
+    EXPECT_EQ(job_key(1, "state"), "3") << "of the one transfer above";
+}
+
+TEST_F(Run, ThePasswordFileHoldsWhatTheServerTakes)
+{
+    struct Case {
+        int pwd_encoded;
+        int server_type;
+        std::string password;
+        std::string content;
+    };
+    const std::vector<Case> cases = {{0, 2, "secret", "secret\n"},
+                                     {0, 1, "secret", "c2VjcmV0\n"},
+                                     {1, 2, "c2VjcmV0", "secret\n"},
+                                     {1, 1, "c2VjcmV0", "c2VjcmV0\n"},
+                                     {0, 2, std::string(127, 'p'), std::string(127, 'p') + "\n"},
+                                     {0, 1, std::string(94, 'p'), ""},
+                                     {1, 2, "!", ""}};
+    write_file("/tmp/victim", "kept");
+    for (const Case &one : cases) {
+        CurrentJob = make_job("it's $x");
+        CurrentJob.pwd_encoded = one.pwd_encoded;
+        CurrentJob.server_type = one.server_type;
+        copy_text(CurrentJob.rsync_pwd, one.password);
+        fs::remove("/tmp/r_it's $x.passwd");
+        fs::create_symlink("/tmp/victim", "/tmp/r_it's $x.passwd");
+        EXPECT_EQ(rsync_write_password_file(), !one.content.empty());
+        if (one.content.empty()) continue;
+        EXPECT_EQ(read_file("/tmp/r_it's $x.passwd"), one.content);
+        EXPECT_EQ(octal_mode("/tmp/r_it's $x.passwd"), "600");
+    }
+    EXPECT_EQ(read_file("/tmp/victim"), "kept");
+}
+
+TEST_F(Run, EachFolderRaisesItsAlertAndTheJobItsState)
+{
+    const std::string places = std::string(FOLDER) + "/a:" + FOLDER + "/no:/elsewhere:" + FOLDER + "/b c";
+    add_job({{"local_path", places}});
+    for (const char *folder : {"a", "b c"})
+        fs::create_directories(std::string(FOLDER) + "/" + folder);
+    write_file("/tmp/run.code", "0\n11\n0\n");
+    EXPECT_EQ(bakjob_program("-r daily").status, 0);
+    const std::string remote = "daily,NAS,backup/S1_remote_backup/daily/Public/";
+    EXPECT_EQ(alerts(), (std::vector<std::string>{"1 2402 " + remote + "a", "1 1400 " + remote + "no",
+                                                  "1 1400 daily,NAS,backup", "1 2402 " + remote + "b c"}));
+    EXPECT_EQ(job_key(1, "state"), "4");
+    EXPECT_EQ(read_file("/tmp/rsync_bakcup_src_folder_name.daily"), std::string(FOLDER) + "/b c\n4/4\n");
+    EXPECT_FALSE(exists("/var/run/bakjob_daily.pid"));
+    EXPECT_NE(read_file("/tmp/arguments").find("bk@127.0.0.1::backup/S1_remote_backup/daily/Public/b c"),
+              std::string::npos);
+}
+
+TEST_F(Run, TheFinalStateFollowsKindAndSchedule)
+{
+    const std::string many = "/mnt/HD/HD_a2/Public:/1:/2:/3:/4:/5:/6:/7:/8:/9:/10:/11";
+    struct Case {
+        Keys keys;
+        std::string run_code;
+        std::string arguments;
+        std::string state;
+        std::string rstate;
+        std::string last_alert;
+    };
+    const std::string name = "daily,NAS,";
+    const std::string remote = "backup/S1_remote_backup/daily/Public";
+    const std::vector<Case> cases = {
+        {{}, "", "-r daily", "2", "0", "1 2402 " + name + remote},
+        {{{"schedule_mode", "3"}}, "", "-r daily", "1", "0", "1 2402 " + name + remote},
+        {{{"schedule_mode", "3"}}, "11", "-r daily", "4", "0", "1 1400 " + name + remote},
+        {{{"local_path", ""}}, "", "-r daily", "2", "0", ""},
+        {{{"backup_type", "2"}}, "", "-r daily", "2", "0", "1 2402 " + name + "Public"},
+        {{}, "", "-i x -r daily", "0", "2", "1 2403 " + name + "Public"},
+        {{}, "11", "-i x -r daily", "0", "4", "1 1401 " + name + "Public"},
+        {{{"local_path", "/short"}, {"backup_type", "2"}}, "", "-r daily", "4", "0", "1 1400 " + name},
+        {{{"local_path", "/mnt/HD/HD_a2/Gone"}}, "", "-i x -r daily", "0", "4", "1 1401 " + name + "Gone"},
+        {{{"local_path", many}}, "", "-r daily", "4", "0", "1 1400 " + name + "backup"},
+        {{{"backup_type", "2"}, {"inc_enable", "1"}},
+         "",
+         "-n 1 -r daily",
+         "2",
+         "0",
+         "1 2402 " + name + "Public"},
+        {{{"backup_type", "2"}, {"inc_enable", "1"}},
+         "11",
+         "-n 1 -r daily",
+         "9",
+         "0",
+         "1 1400 " + name + "Public"},
+        {{{"remote_path", std::string(1000, 'x')}},
+         "",
+         "-r daily",
+         "4",
+         "0",
+         "1 1400 " + name + std::string(500, 'x').substr(0, 511 - name.size())},
+    };
+    for (const Case &one : cases) {
+        SetUp();
+        add_job(one.keys);
+        fs::create_directories(std::string(FOLDER) + "/daily.0");
+        write_file("/tmp/run.code", one.run_code);
+        EXPECT_EQ(bakjob_program(one.arguments).status, 0);
+        EXPECT_EQ(job_key(1, "state") + " " + job_key(1, "rstate"), one.state + " " + one.rstate)
+            << one.arguments << " " << one.last_alert;
+        EXPECT_EQ(alerts().empty() ? "" : alerts().back().substr(0, 8 + 500),
+                  one.last_alert.substr(0, 8 + 500));
+    }
+}
+
+TEST_F(Run, RefusalsChangeNothing)
+{
+    struct Case {
+        Keys keys;
+        std::string arguments;
+        int status;
+        std::string trace;
+    };
+    const std::vector<Case> cases = {
+        {{}, "-d -r other", 255, "ERROR: not found this job_name [other] or disabled\n"},
+        {{{"enable", "0"}}, "-d -r daily", 255, "ERROR: not found this job_name [daily] or disabled\n"},
+        {{}, "-d -r ../daily", 255, "ERROR: not found this job_name [../daily] or disabled\n"},
+        {{}, "-d -r ''", 255, "ERROR: not found this job_name [] or disabled\n"},
+        {{{"job_name", "a/b"}}, "-d -r a/b", 255, "ERROR: not found this job_name [a/b] or disabled\n"},
+        {{{"schedule_mode", "2"}, {"state", "2"}}, "-d -r daily", 255, ""},
+        {{{"schedule_mode", "2"}, {"state", "2"}}, "-d -r daily -b", 255, ""},
+        {{}, "-d -n 1 -r daily", 255, ""},
+        {{{"inc_enable", "1"}, {"backup_type", "2"}}, "-d -n 1 -r daily", 255, ""},
+        {{}, "-d -n 0 -r daily", 255, "ERROR: input error!\n"},
+        {{}, "-d -n 11", 255, "ERROR: input error!\n"},
+        {{}, "-d -n abc", 255, "ERROR: input error!\n"},
+        {{}, "-d -n 4294967297", 255, "ERROR: input error!\n"},
+        {{}, "-d -n -4294967295", 255, "ERROR: input error!\n"},
+        {{}, "-d -k a/b", 0, "ERROR: job name refused: [a/b]\n"},
+        {{}, "-d -n 10 -n -3", 0, ""},
+        {{}, "-d -p cGFrdG8= -p YWJj", 0, "encode_pwd = [pakto]\nencode_pwd = [abcto]\n"},
+    };
+    for (const Case &one : cases) {
+        SetUp();
+        add_job(one.keys);
+        const std::string before = read_file("/etc/NAS_CFG/config.xml");
+        const Ran ran = bakjob_program(one.arguments);
+        EXPECT_EQ(ran.status, one.status) << one.arguments;
+        EXPECT_EQ(ran.output, "OPEN DEBUG MODE!!\n" + one.trace) << one.arguments;
+        EXPECT_EQ(read_file("/etc/NAS_CFG/config.xml"), before);
+        expect_calls("");
+        EXPECT_TRUE(alerts().empty());
+    }
+    SetUp();
+    add_job({{"schedule_mode", "2"}, {"state", "2"}});
+    EXPECT_EQ(bakjob_program("-b -r daily").status, 0);
+    write_file("/var/run/bakjob_daily.pid", "999999\n");
+    EXPECT_EQ(bakjob_program("-d -r daily").output, "OPEN DEBUG MODE!!\nERROR: rsync backup is running!\n");
+    EXPECT_EQ(read_file("/var/run/bakjob_daily.pid"), "999999\n");
+    expect_calls("list write dry run ");
+}
+
+TEST_F(Run, OptionsActInTheirOrder)
+{
+    add_job({{"job_name", "a"}, {"local_path", "/gone"}});
+    add_job({{"job_name", "b"}});
+    const Ran usage = bakjob_program("-h");
+    EXPECT_EQ(usage.status, 0);
+    EXPECT_EQ(usage.output, "\nNAME\n\tbakjob - Run Rsync Backup\t[v1.00_20130904]\n\n"
+                            "SYNOPSIS\n\tbakjob [-h] [-n seq] [-r job_name]\n\nDESCRIPTION\n\t-h\thelp\n"
+                            "\t-b\tforce to run rsync backup (ignore state)\n"
+                            "\t-n\tinput backup seq, and run rsync backup recover to remote\n"
+                            "\t-r\tinput job name, and run rsync backup according to xml setting\n"
+                            "\t-k\tinput job name, and kill rsync backup job\n");
+    for (const char *wrong : {"-x", "-r", "-h -x", "-x -h"}) {
+        EXPECT_EQ(bakjob_program(wrong).status, std::string(wrong).starts_with("-h") ? 0 : 255) << wrong;
+        EXPECT_EQ(bakjob_program(wrong).output, usage.output) << wrong;
+    }
+    EXPECT_EQ(bakjob_program("").output, "");
+    EXPECT_EQ(bakjob_program("-r b -d").output, "OPEN DEBUG MODE!!\n");
+    EXPECT_EQ(job_key(2, "state"), "2");
+    EXPECT_EQ(bakjob_program("-r a -r b").status, 0);
+    EXPECT_EQ(job_key(1, "state") + job_key(2, "state"), "44") << "one failure counts for all that follows";
+    EXPECT_EQ(bakjob_program("-i x -k b").output, "");
+    EXPECT_EQ(job_key(2, "state") + job_key(2, "rstate"), "411");
+    EXPECT_EQ(bakjob_program("-k b -r ''").status, 0) << "an empty name means the last one";
+    EXPECT_EQ(job_key(2, "state"), "2");
+}
+
+TEST_F(Run, TracesItsCommands)
+{
+    add_job({{"backup_type", "2"}, {"inc_enable", "1"}});
+    const auto trace = lines_of(bakjob_program("-d -r daily").output);
+    const std::string command = trace.size() > 9 ? trace[9] : "";
+    ASSERT_TRUE(command.starts_with("rsync_cmd = [/usr/sbin/rsync  --job-name=daily -aHq8 --delete"))
+        << command;
+    const std::string dry =
+        command.substr(0, command.size() - 1) + " --dump-size  --dry-run >/dev/null 2>&1]";
+    const std::string pull = "bk@127.0.0.1::backup/S1_remote_backup/daily/Public";
+    EXPECT_EQ(trace,
+              (std::vector<std::string>{"OPEN DEBUG MODE!!",
+                                        "rysnc test cmd--->[/usr/sbin/rsync  -8 127.0.0.1:: 2>&1]", "--->[]",
+                                        "rysnc write test cmd--->[/usr/sbin/rsync  -a8 --dry-run "
+                                        "--password-file=\"/tmp/r_daily.passwd\" " +
+                                            pull + " /tmp 2>&1]",
+                                        "--->[]", "run rsync_snapshot_rotate() /mnt/HD/HD_a2/Public 3",
+                                        "[/mnt/HD/HD_a2/Public/daily.2]", "[/mnt/HD/HD_a2/Public/daily.1]",
+                                        "[/mnt/HD/HD_a2/Public/daily.0]", command, dry,
+                                        "inc_root_path = [/mnt/HD/HD_a2/Public/daily.0]"}));
+}

@@ -1,0 +1,115 @@
+#include "cli/source_folders.h"
+#include "support.h"
+
+#include <cstring>
+#include <filesystem>
+#include <sys/stat.h>
+
+using namespace bakjob;
+namespace fs = std::filesystem;
+
+class Folders : public Appliance
+{
+protected:
+    void SetUp() override
+    {
+        Appliance::SetUp();
+        add_share("Public", "/mnt/HD/HD_a2/Public");
+        add_share("Inner", "/mnt/HD/HD_a2/Public/inner");
+        add_share("Public2", "/mnt/HD/HD_a2/Public2");
+        add_share("Gone", "/mnt/HD/HD_a2/Gone");
+        fs::remove_all("/mnt/HD/HD_a2/Gone");
+        fs::create_directories("/mnt/HD/HD_a2/Public/x/y");
+        write_file("/mnt/HD/HD_a2/Public/x/f.txt", "");
+        write_file("/mnt/HD/HD_a2/Public/g.txt", "");
+        fs::create_directory_symlink("/tmp", "/mnt/HD/HD_a2/Public/x/link");
+    }
+};
+
+TEST_F(Folders, LieInTheFirstShareThatHoldsThem)
+{
+    struct Case {
+        std::string folder;
+        int result;
+        std::string remote;
+        std::string subdir;
+    };
+    const std::string base = "/mnt/HD/HD_a2/Public";
+    const std::vector<Case> cases = {
+        {base, 0, "/root/Public", "/"},
+        {base + "/x/y", 0, "/root/Public", "/x/y"},
+        {base + "/x/f.txt", 0, "/root/Public", "/x"},
+        {base + "/g.txt", 0, "/root/Public", "/"},
+        {base + "/x/link", 0, "/root/Public", "/x"},
+        {base + "/missing/z", 0, "/root/Public", "/missing"},
+        {base + "/inner", 0, "/root/Public", "/inner"},
+        {base + "2", 0, "/root/Public2", "/"},
+        {base + "23", -1, "", ""},
+        {"/mnt/HD/HD_a2", -1, "", ""},
+        {base + "/../../../etc", -1, "", ""},
+        {base + "/x/..", -1, "", ""},
+        {"/mnt/HD/HD_a2/Gone/x", -1, "/root/Gone", "/"},
+    };
+    for (const Case &one : cases) {
+        fs::current_path("/");
+        EXPECT_EQ(rsync_resolve_folder("/root", one.folder), one.result) << one.folder;
+        EXPECT_EQ(share_remote_dir, one.remote) << one.folder;
+        EXPECT_EQ(share_subdir, one.subdir) << one.folder;
+        EXPECT_EQ(fs::current_path() == share_path, one.result == 0);
+    }
+    EXPECT_EQ(rsync_resolve_folder(std::string(1020, 'r'), base), -1) << "a cut remote folder is another one";
+    Appliance::SetUp();
+    EXPECT_EQ(rsync_resolve_folder("/root", base), -1) << "no shares at all";
+}
+
+TEST_F(Folders, AListIsSplitAndWhatDoesNotFitIsCounted)
+{
+    const auto split = [](const std::string &list) {
+        RsyncJob job{};
+        snprintf(job.local_path, sizeof job.local_path, "%s", list.c_str());
+        FolderTable table{};
+        rsync_split_folders(job, table);
+        std::string all;
+        for (int i = 0; i < table.count; ++i)
+            all += table.entries[i] + std::string("|");
+        return std::to_string(table.left_out) + " " + all;
+    };
+    EXPECT_EQ(split("::/a::/b b:"), "0 /a|/b b|");
+    EXPECT_EQ(split(""), "0 ");
+    EXPECT_EQ(split(":::"), "0 ");
+    EXPECT_EQ(split("1:2:3:4:5:6:7:8:9:10:11:12"), "2 1|2|3|4|5|6|7|8|9|10|");
+    EXPECT_EQ(split("/" + std::string(258, 'x') + ":/b"), "0 /" + std::string(258, 'x') + "|/b|");
+    EXPECT_EQ(split("/" + std::string(259, 'x') + ":/b"), "1 /b|");
+    // A list that fills its field may have lost the end of its last folder.
+    const std::string full = "/a:" + std::string(2596 - 200, ':') + std::string(200, 'x');
+    ASSERT_EQ(full.size(), 2599U);
+    EXPECT_EQ(split(full), "1 /a|");
+    EXPECT_EQ(split(full.substr(1)), "0 a|" + std::string(200, 'x') + "|");
+}
+
+TEST_F(Folders, ProgressAndSerialAreReadAndWrittenSafely)
+{
+    const std::string path = "/tmp/rsync_bakcup_src_folder_name.it's";
+    write_file("/tmp/victim", "kept");
+    fs::create_symlink("/tmp/victim", path);
+    rsync_write_progress("it's", "/mnt/a", 3, 3);
+    EXPECT_EQ(read_file(path), "/mnt/a\n3/3\n");
+    EXPECT_EQ(read_file("/tmp/victim"), "kept");
+    rsync_write_progress("it's", "", 1, 1);
+    EXPECT_EQ(read_file(path), "/mnt/a\n3/3\n");
+    rsync_remove_progress("it's");
+    EXPECT_FALSE(exists(path));
+
+    char serial[SERIAL_SIZE] = "as it was";
+    EXPECT_EQ(rsync_read_serial(serial), -1);
+    EXPECT_STREQ(serial, "as it was");
+    for (const auto &[text, read] : Keys{
+             {"S123", "S123"}, {"S1\nx", "S1\n"}, {"", ""}, {std::string(200, 's'), std::string(127, 's')}}) {
+        write_file("/tmp/kv_serial.txt", text);
+        EXPECT_EQ(rsync_read_serial(serial), 0);
+        EXPECT_EQ(serial, read);
+    }
+    fs::remove("/tmp/kv_serial.txt");
+    ASSERT_EQ(mkfifo("/tmp/kv_serial.txt", 0666), 0);
+    EXPECT_EQ(rsync_read_serial(serial), 0) << "must not wait on a pipe";
+}
