@@ -153,8 +153,8 @@ void rsync_alert_text(const RsyncJob &job)
         place = job.local_path;
         place.remove_prefix(std::min(place.size(), VOLUME_PREFIX_LENGTH));
     }
-    std::snprintf(run_options.alert_text, sizeof run_options.alert_text, "%s,%s,%s", job.job_name, device,
-                  place.data());
+    const std::string text = format_text("%s,%s,%s", job.job_name, device, place.data());
+    copy_text(run_options.alert_text, text.substr(0, sizeof run_options.alert_text - 1));
 }
 
 bool rsync_run_job(const std::string &job_name, bool force, bool &outcome)
