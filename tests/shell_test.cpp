@@ -21,7 +21,7 @@ TEST_F(Shell, ReportsHowACommandEnded)
     ShellReader reader("echo one; exit 5");
     std::string line;
     EXPECT_TRUE(reader.read_line(line));
-    EXPECT_EQ(line, "one\n");
+    EXPECT_EQ(line, "one");
     EXPECT_EQ(reader.close(), 5);
 }
 

@@ -29,8 +29,7 @@ protected:
         std::string all;
         for (int number = 0; number <= 11; ++number) {
             const std::string path = FOLDER + std::string("/") + snapshot_name(name, number);
-            struct stat status {
-            };
+            struct stat status = {};
             if (stat(path.c_str(), &status) != 0) continue;
             all += std::to_string(number) + "=" + read_file(path + "/file").substr(3) + "@" +
                    std::to_string(status.st_mtime) + " ";

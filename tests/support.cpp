@@ -36,8 +36,7 @@ bool exists(const std::string &path)
 
 std::string octal_mode(const std::string &path)
 {
-    struct stat status {
-    };
+    struct stat status = {};
     if (lstat(path.c_str(), &status) != 0) return "none";
     std::array<char, 8> mode{};
     snprintf(mode.data(), mode.size(), "%o", status.st_mode & 07777U);
@@ -77,15 +76,12 @@ bool eventually(const std::function<bool()> &condition, int seconds)
 
 void Appliance::SetUp()
 {
-    for (const char *folder : {"/etc/NAS_CFG", "/tmp", "/mnt/HD", "/var/lib/device_flash", "/remote/backup",
-                               "/remote/data", "/remote/archive"}) {
-        fs::create_directories(folder);
-        for (const auto &entry : fs::directory_iterator(folder))
-            fs::remove_all(entry.path());
-    }
-    for (const auto &entry : fs::directory_iterator("/run")) {
-        if (entry.path().filename().string().starts_with("bakjob_")) fs::remove_all(entry.path());
-    }
+    // Not across mounts: a checkout may lie in /tmp.
+    const std::string folders =
+        "/etc/NAS_CFG /tmp /mnt/HD /var/lib/device_flash /remote/backup /remote/data /remote/archive";
+    shell("cd / && mkdir -p " + folders + " && find " + folders +
+          " -xdev -mindepth 1 -delete 2>/dev/null; "
+          "rm -rf /run/bakjob_*");
     fs::remove("/var/log/device_alerts");
     fs::remove("/etc/cron.d/device_scheduler");
     bakjob::run_options = {};

@@ -1,0 +1,122 @@
+#include "atomic_file.h"
+
+#include <cerrno>
+#include <charconv>
+#include <csignal>
+#include <cstdio>
+#include <dirent.h>
+#include <fcntl.h>
+#include <memory>
+#include <sys/stat.h>
+#include <unistd.h>
+
+using bakjob::UniqueFd;
+
+namespace device
+{
+namespace
+{
+
+constexpr std::string_view TEMPORARY_MARK = ".new.";
+
+struct CloseFolder {
+    void operator()(DIR *folder) const { closedir(folder); }
+};
+
+std::string folder_of(const std::string &path)
+{
+    const std::size_t slash = path.rfind('/');
+    if (slash == std::string::npos) return ".";
+    return slash == 0 ? "/" : path.substr(0, slash);
+}
+
+std::string name_of(const std::string &path)
+{
+    return path.substr(path.rfind('/') + 1);
+}
+
+// The process that a temporary with this start of its name belongs to; 0 when it is no such temporary.
+pid_t owner_of(std::string_view name, std::string_view start)
+{
+    if (!name.starts_with(start)) return 0;
+    name.remove_prefix(start.size());
+    pid_t pid = 0;
+    const auto [end, error] = std::from_chars(name.data(), name.data() + name.size(), pid);
+    const bool whole = error == std::errc() && end == name.data() + name.size();
+    return whole && pid > 0 ? pid : 0;
+}
+
+void remove_leftovers(const std::string &folder, const std::string &start)
+{
+    const std::unique_ptr<DIR, CloseFolder> entries(opendir(folder.c_str()));
+    if (!entries) return;
+    while (const dirent *entry = readdir(entries.get())) {
+        const pid_t owner = owner_of(entry->d_name, start);
+        if (owner == 0) continue;
+        const bool gone = owner == getpid() || (kill(owner, 0) < 0 && errno == ESRCH);
+        if (gone) unlinkat(dirfd(entries.get()), entry->d_name, 0);
+    }
+}
+
+bool write_whole(int fd, std::string_view contents)
+{
+    while (!contents.empty()) {
+        const ssize_t written = write(fd, contents.data(), contents.size());
+        if (written < 0 && errno == EINTR) continue;
+        if (written < 0) return false;
+        contents.remove_prefix(static_cast<std::size_t>(written));
+    }
+    return true;
+}
+
+// The rename is on disk only when the folder is. A failure here cannot be undone, nor does it make the new
+// file a wrong one, so it is nobody's failure.
+void sync_folder(const std::string &folder)
+{
+    const UniqueFd fd(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (fd) fsync(fd.get());
+}
+
+} // namespace
+
+UniqueFd replace_file(const std::string &path, std::string_view contents, mode_t mode)
+{
+    const std::string folder = folder_of(path);
+    const std::string start = name_of(path) + std::string(TEMPORARY_MARK);
+    remove_leftovers(folder, start);
+
+    const std::string temporary = path + std::string(TEMPORARY_MARK) + std::to_string(getpid());
+    UniqueFd fd(open(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600));
+    if (!fd) return {};
+    const bool replaced = fchmod(fd.get(), mode) == 0 && write_whole(fd.get(), contents) &&
+                          fsync(fd.get()) == 0 && std::rename(temporary.c_str(), path.c_str()) == 0;
+    if (!replaced) {
+        const int reason = errno;
+        unlink(temporary.c_str());
+        errno = reason;
+        return {};
+    }
+    sync_folder(folder);
+    return fd;
+}
+
+bool read_whole(int fd, std::string &contents)
+{
+    contents.clear();
+    struct stat status = {};
+    if (fstat(fd, &status) < 0) return false;
+    std::size_t used = 0;
+    contents.resize(static_cast<std::size_t>(status.st_size) + 1);
+    for (;;) {
+        if (used == contents.size()) contents.resize(2 * used);
+        const ssize_t count = read(fd, contents.data() + used, contents.size() - used);
+        if (count < 0 && errno == EINTR) continue;
+        if (count < 0) return false;
+        if (count == 0) break;
+        used += static_cast<std::size_t>(count);
+    }
+    contents.resize(used);
+    return true;
+}
+
+} // namespace device

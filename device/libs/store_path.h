@@ -1,0 +1,32 @@
+#pragma once
+
+// Paths of the configuration store, taken apart: "/backup_mgr/rsync/item:2/job_name".
+
+#include <array>
+#include <cstddef>
+#include <span>
+#include <string_view>
+
+namespace device
+{
+
+struct Step {
+    std::string_view name;
+    int index = 0; // counted from 1; 0: the step has no number, and means the first of that name
+};
+
+struct StorePath {
+    static constexpr std::size_t MOST_STEPS = 16;
+    static constexpr int HIGHEST_INDEX = 1'000'000; // setting a node creates all before it
+
+    std::array<Step, MOST_STEPS> steps;
+    std::size_t depth = 0; // 0: malformed
+
+    [[nodiscard]] std::span<const Step> used() const { return {steps.data(), depth}; }
+    [[nodiscard]] bool numbered() const;
+};
+
+// Never fails otherwise than by a depth of 0. The steps are views into `text`.
+StorePath parse_store_path(std::string_view text);
+
+} // namespace device

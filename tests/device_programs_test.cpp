@@ -1,0 +1,133 @@
+// The stand-in programs, against the real rsync daemon and the real ssh server of the remote side.
+
+#include "support.h"
+
+#include <algorithm>
+#include <string>
+#include <sys/types.h>
+#include <utility>
+#include <vector>
+
+namespace
+{
+
+// What the callers judge: the first line of both outputs. Nothing may take more than a moment.
+std::string first_line(const std::string &command)
+{
+    std::string line = shell("timeout 20 " + command + " 2>&1 </dev/null | head -1").output;
+    line.erase(line.find_last_not_of("\r\n") + 1);
+    return line;
+}
+
+int count_lines(const std::string &text, const std::vector<std::string> &parts)
+{
+    const auto lines = lines_of(text);
+    return static_cast<int>(std::count_if(lines.begin(), lines.end(), [&](const std::string &line) {
+        return std::all_of(parts.begin(), parts.end(),
+                           [&](const std::string &part) { return line.find(part) != std::string::npos; });
+    }));
+}
+
+std::string far_end()
+{
+    const auto lines = lines_of(read_file("/run/remote_link_local"));
+    return lines.empty() ? "" : lines.front() + "%egiga0";
+}
+
+class Programs : public Appliance
+{
+protected:
+    void SetUp() override
+    {
+        Appliance::SetUp();
+        shell("rm -f ~root/.ssh/known_hosts");
+    }
+};
+
+TEST_F(Programs, SshSaysFirstWhatTheStockClientHasToSay)
+{
+    const std::string denied = "root@127.0.0.1: Permission denied (publickey,password).";
+    const std::vector<std::pair<std::string, std::string>> first_contact = {
+        {"-d cm9vdHB3 root@127.0.0.1 echo hello", "hello"},
+        {"-dYmtwdw== bk@::1 whoami", "bk"},
+        {"-d d3Jvbmc= root@127.0.0.1 echo hello", denied},
+        {"root@127.0.0.1 echo hello", denied},
+        {"-d '' root@127.0.0.1 echo hello", denied},
+        {"-d '*' root@127.0.0.1 echo hello", "ssh: the password after -d is not base64 text"},
+        {"-p 2 root@127.0.0.1 echo hello", "ssh: connect to host 127.0.0.1 port 2: Connection refused"},
+        {"-c none-such -d cm9vdHB3 root@127.0.0.1 echo hello", "hello"},
+        {"-c none-such,aes128-ctr -d cm9vdHB3 root@127.0.0.1 echo -d x", "-d x"},
+    };
+    for (const auto &[arguments, line] : first_contact) {
+        shell("rm -f ~root/.ssh/known_hosts");
+        EXPECT_EQ(first_line("/usr/sbin/ssh " + arguments), line) << arguments;
+    }
+    EXPECT_EQ(first_line("/usr/sbin/ssh -d cm9vdHB3 root@127.0.0.1 echo again"), "again");
+    if (!far_end().empty()) {
+        EXPECT_EQ(first_line("/usr/sbin/ssh -d cm9vdHB3 root@" + far_end() + " echo far"), "far");
+    }
+
+    shell("ssh-keygen -q -t ed25519 -N '' -f /tmp/key && (printf '127.0.0.1 '; cat /tmp/key.pub) "
+          ">~root/.ssh/known_hosts");
+    EXPECT_EQ(first_line("/usr/sbin/ssh -d cm9vdHB3 root@127.0.0.1 echo hello"), std::string(59, '@'));
+}
+
+TEST_F(Programs, NoProcessShowsTheLoginPassword)
+{
+    shell("/usr/sbin/ssh -d cm9vdHB3 root@127.0.0.1 'sleep 3.14' >/dev/null 2>&1 &");
+    std::string processes; // of the whole time until the command runs over there
+    EXPECT_TRUE(eventually([&] {
+        processes += shell("ps -ww").output;
+        return shell("pgrep -fx 'sleep 3.14'").status == 0;
+    })) << processes;
+    EXPECT_GT(count_lines(processes, {"/usr/bin/ssh"}), 0) << processes;
+    EXPECT_EQ(count_lines(processes, {"/usr/bin/ssh", "cm9vdHB3"}), 0) << processes;
+    EXPECT_EQ(processes.find("rootpw"), std::string::npos) << processes;
+}
+
+TEST_F(Programs, ATransferShowsItsJobInEveryProcess)
+{
+    write_file("/tmp/from/file", std::string(1'000'000, 'x'));
+    shell("rsync --job-name='my job' --dump-size --bwlimit=10 /tmp/from/file /tmp/to >/dev/null 2>&1 &");
+    std::string processes;
+    const std::vector<std::string> parts = {"/usr/sbin/rsync", "job-name=my job", "--bwlimit=10"};
+    EXPECT_TRUE(eventually([&] {
+        processes = shell("ps -ww").output;
+        return count_lines(processes, parts) == 3;
+    })) << processes;
+    for (const std::string &line : lines_of(processes)) {
+        if (line.find("job-name=my job") != std::string::npos)
+            shell("kill " + std::to_string(std::stol(line)));
+    }
+    EXPECT_TRUE(eventually([&] { return count_lines(shell("ps").output, parts) == 0; }));
+}
+
+TEST_F(Programs, RsyncReachesEveryKindOfPlaceAndAsksNothing)
+{
+    write_file("/remote/data/file", "x");
+    const std::string stock = "rsync -e '/usr/sbin/ssh -d cm9vdHB3' ";
+    for (const std::string &command :
+         {std::string("rsync 127.0.0.1::data/file"), std::string("rsync '[::1]::data/file'"),
+          std::string("rsync rsync://127.0.0.1/data/file"), stock + "root@127.0.0.1:/remote/data/file",
+          stock + "'root@[::1]:/remote/data/file'", stock + "127.0.0.1::data/file",
+          std::string("RSYNC_PASSWORD=secret rsync bk@127.0.0.1::backup"),
+          std::string("RSYNC_PASSWORD=cGFrdG8= rsync root@127.0.0.1::backup")}) {
+        const Ran ran = shell("(" + command + ") 2>&1 </dev/null");
+        EXPECT_EQ(ran.status, 0) << command << "\n" << ran.output;
+    }
+    EXPECT_EQ(first_line("rsync bk@127.0.0.1::backup"), "@ERROR: auth failed on module backup");
+    EXPECT_EQ(first_line("rsync bk@127.0.0.1:/remote"),
+              "bk@127.0.0.1: Permission denied (publickey,password).");
+}
+
+TEST_F(Programs, PsShowsOneLineAProcessOfAnyLength)
+{
+    shell("sh -c 'sleep 5; : \"a\nb\"' \"$(head -c 90000 /dev/zero | tr '\\0' z)\" end >/dev/null 2>&1 &");
+    std::string processes;
+    EXPECT_TRUE(eventually([&] {
+        processes = shell("ps -ww").output;
+        return count_lines(processes, {"sleep 5; : \"a b\" zzz", "zzz end"}) == 1;
+    })) << processes.substr(0, 2000);
+}
+
+} // namespace
