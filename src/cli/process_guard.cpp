@@ -36,8 +36,7 @@ bool holds_process_id(const std::string &path)
 
 bool rsync_pid_file_absent(const std::string &job_name)
 {
-    struct stat status {
-    };
+    struct stat status = {};
     return lstat(pid_file(job_name).c_str(), &status) != 0;
 }
 

@@ -66,8 +66,7 @@ int rsync_list_snapshots(const std::string &job_name)
     const int found = scandir(recover_list.dir, &names, rsync_snapshot_filter, alphasort);
     for (int i = 0; i < found; ++i) {
         const std::string path = folder + '/' + names[i]->d_name;
-        struct stat status {
-        };
+        struct stat status = {};
         const bool is_folder = stat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
         if (is_folder && recover_list.count < RecoverList::SIZE) add_entry(path, status);
         std::free(names[i]);

@@ -10,7 +10,6 @@
 #include <cstring>
 #include <fcntl.h>
 #include <string_view>
-#include <sys/stat.h>
 #include <unistd.h>
 
 namespace bakjob
@@ -56,13 +55,6 @@ public:
         return share;
     }
 };
-
-bool is_directory(const std::string &path)
-{
-    struct stat status {
-    };
-    return lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
-}
 
 // What looks like a folder below a share may then lie anywhere.
 bool leaves_share(const std::string &folder)

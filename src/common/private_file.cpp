@@ -32,8 +32,7 @@ UniqueFd open_own_file(const std::string &path, int flags)
 {
     UniqueFd file(open(path.c_str(), flags | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
     if (!file) return file;
-    struct stat status {
-    };
+    struct stat status = {};
     if (fstat(file.get(), &status) == 0 && S_ISREG(status.st_mode) && status.st_uid == geteuid() &&
         status.st_nlink == 1) {
         return file;
@@ -41,6 +40,12 @@ UniqueFd open_own_file(const std::string &path, int flags)
     file.reset();
     errno = EPERM;
     return file;
+}
+
+bool is_directory(const std::string &path)
+{
+    struct stat status = {};
+    return lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
 }
 
 bool write_all(int fd, std::string_view contents)

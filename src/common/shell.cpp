@@ -2,6 +2,7 @@
 
 #include "common/text.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <csignal>
 #include <cstdio>
@@ -17,14 +18,15 @@ namespace bakjob
 namespace
 {
 
+constexpr std::size_t FIRST_LINE_LENGTH = 1023;
+
 // While a command runs, an interrupt from the terminal is for the command alone.
 class IgnoreInterrupts
 {
 public:
     IgnoreInterrupts()
     {
-        struct sigaction ignore {
-        };
+        struct sigaction ignore = {};
         ignore.sa_handler = SIG_IGN;
         sigaction(SIGINT, &ignore, &interrupt_);
         sigaction(SIGQUIT, &ignore, &quit_);
@@ -40,10 +42,8 @@ public:
     }
 
 private:
-    struct sigaction interrupt_ {
-    };
-    struct sigaction quit_ {
-    };
+    struct sigaction interrupt_ = {};
+    struct sigaction quit_ = {};
 };
 
 // In the child: never returns. `output` below 0 keeps the program's own standard output.
@@ -108,10 +108,7 @@ ShellReader::~ShellReader()
 
 bool ShellReader::read_line(std::string &line)
 {
-    char buffer[1024];
-    if (!output_ || std::fgets(buffer, sizeof buffer, output_.get()) == nullptr) return false;
-    line = buffer;
-    return true;
+    return output_ && bakjob::read_line(output_.get(), line);
 }
 
 int ShellReader::close()
@@ -132,6 +129,7 @@ std::optional<std::string> first_reply_line(const std::string &command)
     while (reply.read_line(rest)) {
     }
     reply.close();
+    first.resize(std::min(first.size(), FIRST_LINE_LENGTH));
     trim_right(first);
     return first;
 }

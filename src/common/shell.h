@@ -38,7 +38,7 @@ public:
     // Whether the command could be started.
     [[nodiscard]] bool started() const { return output_ != nullptr; }
 
-    // The next line with its line break, or the next 1023 bytes of a longer one; false at the end.
+    // The next line (read_line of text.h); false at the end.
     bool read_line(std::string &line);
 
     // Stops reading and waits; the result of run_shell.

@@ -40,11 +40,8 @@ bool holds_any(std::string_view text, std::string_view characters)
 // `ending` holds the characters that end a name of this kind within rsync's or ssh's own argument.
 bool is_safe_name(const char *field, std::string_view name, std::string_view ending)
 {
-    if (name.starts_with('-')) return refused(field, "begins with an option's dash");
-    if (holds_control(name) || contains(name, " ")) return refused(field, "blank or control character");
-    if (holds_any(name, SHELL_SPECIAL)) return refused(field, "character special to the shell");
-    if (holds_any(name, ending)) return refused(field, "character that ends a name");
-    return true;
+    if (!is_plain_for_shells(field, name)) return false;
+    return !holds_any(name, ending) || refused(field, "character that ends a name");
 }
 
 std::string with_backslashes(std::string_view text, std::string_view before)
@@ -81,6 +78,13 @@ std::optional<std::string> shell_path(const char *field, std::string_view path)
         return std::nullopt;
     }
     return escaped;
+}
+
+bool is_plain_for_shells(const char *field, std::string_view path)
+{
+    if (path.starts_with('-')) return refused(field, "begins with an option's dash");
+    if (holds_control(path) || contains(path, " ")) return refused(field, "blank or control character");
+    return !holds_any(path, SHELL_SPECIAL) || refused(field, "character special to the shell");
 }
 
 std::string shell_word(std::string_view job_name)

@@ -20,6 +20,10 @@ bool is_job_name(std::string_view name);
 // trace.
 std::optional<std::string> shell_path(const char *field, std::string_view path);
 
+// Whether a path holds nothing that any shell acts on, blanks included: for commands that the shell of the
+// remote host reads once more, after the escapes are gone.
+bool is_plain_for_shells(const char *field, std::string_view path);
+
 // A job name, or a file name made of one, as part of a word. Only for names that is_job_name accepts, or the
 // empty one.
 std::string shell_word(std::string_view job_name);

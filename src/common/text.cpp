@@ -1,5 +1,6 @@
 #include "common/text.h"
 
+#include <algorithm>
 #include <cstdarg>
 #include <cstdio>
 #include <cstring>
@@ -22,7 +23,7 @@ bool is_trimmed(char c)
 
 bool copy_text(char *field, std::size_t size, std::string_view source)
 {
-    if (source.size() >= size) return false;
+    if (source.size() >= size || contains(source, {"", 1})) return false;
     std::memmove(field, source.data(), source.size());
     field[source.size()] = '\0';
     return true;
@@ -40,6 +41,26 @@ std::string format_text(const char *format, ...)
     if (length > 0) std::vsnprintf(text.data(), text.size() + 1, format, again);
     va_end(again);
     return text;
+}
+
+bool read_line(std::FILE *file, std::string &line)
+{
+    line.clear();
+    int c = std::getc(file);
+    if (c == EOF) return false;
+    for (; c != EOF && c != '\n'; c = std::getc(file)) {
+        if (line.size() < LINE_LENGTH) line += static_cast<char>(c);
+    }
+    return true;
+}
+
+std::string_view next_word(std::string_view &text)
+{
+    constexpr std::string_view BLANKS = " \t\n\v\f\r";
+    text.remove_prefix(std::min(text.find_first_not_of(BLANKS), text.size()));
+    const std::string_view word = text.substr(0, text.find_first_of(BLANKS));
+    text.remove_prefix(word.size());
+    return word;
 }
 
 void trim_right(char *text)

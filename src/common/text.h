@@ -4,6 +4,7 @@
 // paths. The rules about what may go into a command at all are in shell_text.h.
 
 #include <cstddef>
+#include <cstdio>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -13,8 +14,8 @@ namespace bakjob
 
 inline constexpr std::size_t PATH_SIZE = 1024; // bytes of a path buffer, terminator included
 
-// Copies `source` into the field as a terminated text. A text that does not fit is refused: false, and the
-// field is as it was.
+// Copies `source` into the field as a terminated text. A text that does not fit, or holds a zero byte, is
+// refused: false, and the field is as it was.
 bool copy_text(char *field, std::size_t size, std::string_view source);
 
 template <std::size_t N>
@@ -30,6 +31,15 @@ inline bool contains(std::string_view text, std::string_view part)
 {
     return text.find(part) != std::string_view::npos;
 }
+
+// Reads a line from a foreign text, without its line break; false at the end. Of a line longer than
+// LINE_LENGTH only so much is kept, which is more than fits any field: it is refused there, not taken for
+// another.
+inline constexpr std::size_t LINE_LENGTH = 4095;
+bool read_line(std::FILE *file, std::string &line);
+
+// The first blank-separated word of a text, which it leaves in front of what follows; empty at the end.
+std::string_view next_word(std::string_view &text);
 
 // Removes trailing white space and control characters (those of the C locale) in place.
 void trim_right(char *text);

@@ -27,10 +27,8 @@ UniqueFd open_lock_file(const char *path)
 
 bool is_still_at(const char *path, int file)
 {
-    struct stat there {
-    };
-    struct stat here {
-    };
+    struct stat there = {};
+    struct stat here = {};
     return lstat(path, &there) == 0 && fstat(file, &here) == 0 && there.st_ino == here.st_ino &&
            there.st_dev == here.st_dev;
 }

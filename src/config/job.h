@@ -19,7 +19,7 @@ inline constexpr const char *DEFAULT_PORT = "873";
 enum ServerType : std::int32_t { SERVER_SAME_KIND = 1, SERVER_ANY = 2 };
 enum BackupType : std::int32_t { BACKUP_PUSH = 1, BACKUP_PULL = 2 };
 enum ScheduleMode : std::int32_t { SCHEDULE_TIMETABLE = 1, SCHEDULE_ONCE = 2, SCHEDULE_EVENT = 3 };
-inline constexpr std::int32_t RSYNC_MODE_DAEMON = 2;
+enum RsyncMode : std::int32_t { RSYNC_MODE_SHELL = 1, RSYNC_MODE_DAEMON = 2 };
 
 struct RsyncJob {
     std::int32_t enable;

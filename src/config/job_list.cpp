@@ -55,9 +55,7 @@ int rsync_list_add_job(const RsyncJob &source)
     if (rsync_find_job(source.job_name) != nullptr) return 0;
     RsyncJob *const job = rsync_new_job();
     if (job == nullptr) return 0;
-    (job_list->head == nullptr ? job_list->head : job_list->tail->next) = job;
-    job_list->tail = job;
-    ++job_list->count;
+    job_list->append(job);
     rsync_copy_job(*job, source);
     apply_defaults(*job);
     return 1;
@@ -73,29 +71,12 @@ RsyncJob *rsync_find_job(std::string_view job_name)
 
 int rsync_list_remove_job(RsyncJob *job)
 {
-    if (job == nullptr) return 0;
-    RsyncJob *before = nullptr;
-    RsyncJob *found = job_list->head;
-    while (found != nullptr && found != job) {
-        before = found;
-        found = found->next;
-    }
-    if (found == nullptr) return 0;
-    (before == nullptr ? job_list->head : before->next) = job->next;
-    if (job_list->tail == job) job_list->tail = before;
-    --job_list->count;
-    delete job;
-    return 1;
+    return job != nullptr && job_list->remove(job) ? 1 : 0;
 }
 
 void rsync_free_jobs()
 {
-    while (job_list->head != nullptr) {
-        RsyncJob *const job = job_list->head;
-        job_list->head = job->next;
-        delete job;
-    }
-    *job_list = {};
+    job_list->clear();
 }
 
 } // namespace bakjob

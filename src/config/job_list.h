@@ -5,17 +5,14 @@
 // needs a job beyond that keeps a copy.
 
 #include "config/job.h"
+#include "config/record_list.h"
 
 #include <string_view>
 
 namespace bakjob
 {
 
-struct RsyncJobList {
-    int count;
-    RsyncJob *head;
-    RsyncJob *tail;
-};
+using RsyncJobList = RecordList<RsyncJob>;
 
 extern RsyncJobList *const job_list; // the process's one list
 

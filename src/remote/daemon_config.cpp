@@ -54,10 +54,10 @@ bool read_daemon_config(const std::string &local_copy, const std::function<bool(
     const UniqueFile file(opened ? fdopen(opened.get(), "r") : nullptr);
     if (!file) return false;
     opened.release();
-    char buffer[1024];
-    while (std::fgets(buffer, sizeof buffer, file.get()) != nullptr) {
-        trim_right(buffer);
-        if (!line(buffer)) break;
+    std::string text;
+    while (read_line(file.get(), text)) {
+        trim_right(text);
+        if (!line(text)) break;
     }
     return true;
 }

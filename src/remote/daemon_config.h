@@ -19,8 +19,8 @@ std::optional<std::string> section_name(std::string_view line);
 // The folder of a path line, or nothing when the line has no "path = ".
 std::optional<std::string> path_of_line(std::string_view line);
 
-// Reads a local copy of the configuration line by line, without trailing white space, in pieces of at most
-// 1023 bytes, until the visitor answers false. False when it cannot be opened.
+// Reads a local copy of the configuration line by line, without trailing white space, until the visitor
+// answers false. False when it cannot be opened.
 bool read_daemon_config(const std::string &local_copy, const std::function<bool(const std::string &)> &line);
 
 // Fetches the remote host's "/etc/rsyncd.conf" over ssh into `local_copy` (CurrentJob's host and password)

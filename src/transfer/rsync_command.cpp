@@ -3,13 +3,12 @@
 #include "common/address.h"
 #include "common/debug_log.h"
 #include "common/job_files.h"
+#include "common/private_file.h"
 #include "common/run_options.h"
 #include "common/shell.h"
 #include "common/shell_text.h"
 #include "common/text.h"
 #include "config/current_job.h"
-
-#include <sys/stat.h>
 
 namespace bakjob
 {
@@ -75,14 +74,6 @@ std::optional<std::string> options(const RsyncJob &job)
     return text;
 }
 
-// Only a directory, not a link to one, is copied by its contents.
-const char *slash_suffix(const char *local_path)
-{
-    struct stat status {
-    };
-    return lstat(local_path, &status) == 0 && S_ISDIR(status.st_mode) ? "/" : "";
-}
-
 std::string snapshot_path(const RsyncJob &job, int number)
 {
     return std::string(job.local_path) + '/' + snapshot_name(job.job_name, number);
@@ -106,7 +97,8 @@ std::optional<std::string> rsync_build_command(const RsyncJob &job)
     const auto remote_path = shell_path("remote_path", job.remote_path);
     if (!option_text || !remote_path) return std::nullopt;
 
-    const std::string slash = slash_suffix(job.local_path);
+    // Only a directory, not a link to one, is copied by its contents.
+    const std::string slash = is_directory(job.local_path) ? "/" : "";
     const bool recover = run_options.recover_seq != 0;
     const bool pull = !recover && job.backup_type != BACKUP_PUSH;
     std::string local = job.local_path + slash;

@@ -25,8 +25,7 @@ std::string snapshot_path(const std::string &folder, const std::string &job_name
 
 void run_step(const std::string &command, const std::string &from, const std::string &to)
 {
-    struct stat status {
-    };
+    struct stat status = {};
     const bool has_times = stat(from.c_str(), &status) == 0;
     run_shell(command);
     if (has_times && !to.empty()) {

@@ -1,0 +1,146 @@
+#include "remote/discovery.h"
+
+#include "common/debug_log.h"
+#include "common/job_files.h"
+#include "common/shell.h"
+#include "common/text.h"
+#include "config/current_job.h"
+#include "config/remote_modules.h"
+#include "remote/daemon_config.h"
+#include "remote/daemon_test.h"
+#include "remote/sizes.h"
+#include "remote/ssh_login.h"
+
+#include <unistd.h>
+
+namespace bakjob
+{
+
+namespace
+{
+
+constexpr int MOST_MODULES = 1024;
+
+void clear_list()
+{
+    rsync_free_modules();
+    *module_list = {};
+}
+
+void add_configured_modules(const std::string &local_copy)
+{
+    std::string name;
+    std::string path;
+    const auto add_if_whole = [&] {
+        if (name.empty() || path.empty()) return;
+        add_found_module(name, path);
+        name.clear();
+        path.clear();
+    };
+    read_daemon_config(local_copy, [&](const std::string &line) {
+        add_if_whole();
+        if (const auto folder = path_of_line(line)) {
+            path = *folder;
+        } else if (const auto section = section_name(line)) {
+            name = *section;
+        }
+        return true;
+    });
+    add_if_whole();
+}
+
+void measure_remote_side()
+{
+    if (CurrentJob.backup_type == BACKUP_PUSH) {
+        rsync_remote_free_space(module_list->remote_free);
+        return;
+    }
+    for (RemoteModule *module = module_list->head; module != nullptr; module = module->next) {
+        rsync_remote_du(module->path, module->du_size);
+    }
+}
+
+void measure_this_device()
+{
+    for (int i = 0; i < VOLUMES; ++i) {
+        const std::string mount_point = std::string("/mnt/HD/") + VOLUME_NAMES[i];
+        if (access(mount_point.c_str(), F_OK) == 0) {
+            rsync_local_free_space(VOLUME_NAMES[i], module_list->local_free[i]);
+        }
+    }
+    std::string folders = CurrentJob.local_path; // is cut
+    rsync_local_du(folders.data(), module_list->local_size);
+}
+
+} // namespace
+
+void add_found_module(const std::string &name, const std::string &path)
+{
+    RemoteModule module{};
+    if (!copy_text(module.name, name) || !copy_text(module.path, path)) {
+        DebugLog("ERROR: remote module skipped: name or path too long\n");
+    } else if (module_list->count < MOST_MODULES) {
+        copy_text(module.du_size, "0");
+        rsync_add_module(module);
+    }
+}
+
+void rsync_discover_remote()
+{
+    if (CurrentJob.server_type == SERVER_ANY) {
+        rsync_list_daemon_modules();
+        return;
+    }
+    clear_list();
+    if (CurrentJob.backup_type == BACKUP_PULL && CurrentJob.rsync_mode == RSYNC_MODE_SHELL) {
+        rsync_remote_du(CurrentJob.remote_path, module_list->remote_size);
+        return;
+    }
+    if (!fetch_daemon_config(DISCOVERY_CONFIG_COPY)) return;
+    add_configured_modules(DISCOVERY_CONFIG_COPY);
+    unlink(DISCOVERY_CONFIG_COPY);
+    sync();
+    measure_remote_side();
+    measure_this_device();
+}
+
+int rsync_list_daemon_modules()
+{
+    clear_list();
+    measure_this_device();
+    const auto command = module_list_command(CurrentJob);
+    if (!command) return 0;
+    ShellReader reply(*command);
+    if (!reply.started()) return 0;
+    for (std::string line; reply.read_line(line);) {
+        trim_right(line);
+        const std::size_t tab = line.find('\t');
+        if (tab != std::string::npos) line.resize(line.find_last_not_of(' ', tab - 1) + 1);
+        add_found_module(line, "");
+    }
+    return reply.close();
+}
+
+RemoteReplyCode rsync_check_remote_secret()
+{
+    char expected[PASSWORD_SIZE] = "";
+    if (CurrentJob.pwd_encoded != 0) {
+        copy_text(expected, CurrentJob.rsync_pwd);
+    } else if (password_encode(expected, CurrentJob.rsync_pwd, sizeof expected) < 0) {
+        return REPLY_AUTH_FAILED;
+    }
+    const auto command =
+        ssh_command(CurrentJob, SshLogin::as_client, "cat /etc/rsyncd.secrets 2>/dev/null | grep root:");
+    if (!command) return REPLY_AUTH_FAILED;
+    ShellReader reply(*command);
+    std::string line;
+    reply.read_line(line);
+    reply.close();
+    trim_right(line);
+    constexpr std::string_view USER = "root:";
+    const std::size_t user = line.find(USER);
+    const bool matches = user != std::string::npos && line.substr(user + USER.size()) == expected;
+    return matches ? REPLY_OK : REPLY_AUTH_FAILED;
+}
+
+} // namespace bakjob
