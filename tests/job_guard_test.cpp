@@ -181,10 +181,25 @@ TEST_F(State, TheLockIsExclusiveAndNobodyElsesFile)
     fs::create_symlink("/tmp/victim", path);
     EXPECT_TRUE(rsync_lock_config(path));
     EXPECT_EQ(read_file("/tmp/victim"), "kept");
-    EXPECT_EQ(octal_mode(path), "600");
+    EXPECT_TRUE(fs::is_regular_file(fs::symlink_status(path)));
     fs::remove(path);
     ASSERT_EQ(mkfifo(path, 0666), 0);
     EXPECT_TRUE(rsync_lock_config(path)) << "must not wait on a pipe";
+    fs::remove(path);
+    // Another user's lock is a lock too.
+    shell("install -o 1 -m 644 /dev/null /tmp/lock");
+    const pid_t holder = fork();
+    if (holder == 0) {
+        const UniqueFd held = rsync_lock_config(path);
+        write_file("/tmp/held", "");
+        usleep(300'000);
+        write_file("/tmp/released", "");
+        _exit(0);
+    }
+    ASSERT_TRUE(eventually([] { return exists("/tmp/held"); }));
+    EXPECT_TRUE(rsync_lock_config(path));
+    EXPECT_TRUE(exists("/tmp/released"));
+    waitpid(holder, nullptr, 0);
     EXPECT_FALSE(rsync_lock_config("/no/such/folder/lock"));
 }
 

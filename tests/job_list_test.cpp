@@ -61,11 +61,16 @@ TEST_F(JobList, PasswordsAreEncodedOnceAndNeverLost)
         std::string ssh_after;
     };
     const std::vector<Case> cases = {
-        {0, 0, "pw", "ssh", 1, "cHc=", "ssh"},         {0, 1, "pw", "ssh", 1, "cHc=", "c3No"},
-        {0, 1, "", "ssh", 1, "cGFrdG8=", "c3No"},      {1, 1, "cHc=", "c3No", 1, "cHc=", "c3No"},
+        {0, 0, "pw", "ssh", 1, "cHc=", "ssh"},
+        {0, 1, "pw", "ssh", 1, "cHc=", "c3No"},
+        {0, 1, "", "ssh", 1, "cGFrdG8=", "c3No"},
+        {1, 1, "cHc=", "c3No", 1, "cHc=", "c3No"},
+        {-1, 1, "cHc=", "c3No", 1, "cHc=", "c3No"},
         {1, 1, "", "c3No", 1, "cGFrdG8=", "c3No"}, // must not be encoded twice
-        {0, 1, fits, "ssh", 1, std::string(), "c3No"}, {0, 1, too_long, "ssh", 0, too_long, "ssh"},
-        {0, 1, "pw", too_long, 0, "pw", too_long},     {0, 0, "pw", too_long, 1, "cHc=", too_long},
+        {0, 1, fits, "ssh", 1, std::string(), "c3No"},
+        {0, 1, too_long, "ssh", 0, too_long, "ssh"},
+        {0, 1, "pw", too_long, 0, "pw", too_long},
+        {0, 0, "pw", too_long, 1, "cHc=", too_long},
     };
     for (const Case &one : cases) {
         RsyncJob job = make_job("j");
@@ -152,8 +157,19 @@ TEST_F(JobList, LoadingBringsNumbersIntoRange)
     store_set("/backup_mgr/rsync/count", "2");
     rsync_load_jobs();
     EXPECT_EQ(std::string(job_list->head->local_path), std::string(2599, 'x'));
+    EXPECT_TRUE(was_cut(*job_list->head, "local_path"));
+    EXPECT_EQ(cut_command_field(*job_list->head), nullptr);
     EXPECT_STREQ(job_list->tail->job_name, "") << "counted, but not there";
     EXPECT_EQ(job_list->tail->retry_interval, 30);
+    store_set("/backup_mgr/rsync/count", "2147483647");
+    store_save();
+    rsync_load_jobs();
+    EXPECT_EQ(job_list->count, 2) << "a count beyond all reason ends with what is there";
+    SetUp();
+    add_job({{"local_path", std::string(2599, 'x')}, {"port", std::string(16, '8')}});
+    rsync_load_jobs();
+    EXPECT_FALSE(was_cut(*job_list->head, "local_path"));
+    EXPECT_STREQ(cut_command_field(*job_list->head), "port");
 }
 
 TEST_F(JobList, OnlyThePasswordFileIsWrittenBackToTheCaller)

@@ -66,7 +66,11 @@ TEST_F(Schedule, PruningKeepsExactlyTheEntriesThatNameAJob)
         {{long_name}, {"-r '" + long_name + "'", "-r 'x'"}, "-r '" + long_name + "'|", all_groups, true},
         {{"a"}, {}, "", all_groups, false},
         // Longer than what is read of it: not judged.
-        {{"a"}, {std::string(300, 'x') + "'a'", "-r 'b'"}, std::string(300, 'x') + "'a'|", all_groups, true},
+        {{"a"},
+         {std::string(255, 'x'), std::string(300, 'x') + "'a'", "-r 'b'"},
+         std::string(300, 'x') + "'a'|",
+         all_groups,
+         true},
     };
     for (const Case &one : cases) {
         SetUp();

@@ -48,19 +48,6 @@ TEST_F(Shell, OnlyTheFirstLineOfAReplyCounts)
     EXPECT_TRUE(exists("/tmp/ended"));
 }
 
-TEST_F(Shell, ACommandDiesWithItsRunner)
-{
-    const pid_t runner = fork();
-    if (runner == 0) {
-        run_shell("exec sleep 4711");
-        _exit(0);
-    }
-    const auto sleeps = [] { return shell("ps | grep -c '[s]leep 4711'").output == "1\n"; };
-    ASSERT_TRUE(eventually(sleeps));
-    kill(runner, SIGKILL);
-    EXPECT_TRUE(eventually([&] { return !sleeps(); }));
-}
-
 TEST_F(Shell, QuotedNamesReachTheProgramAsTheyAre)
 {
     const std::vector<std::string> names = {"plain",          "My Photos (2013)",
@@ -125,9 +112,12 @@ TEST_F(Shell, WhatCannotBeQuotedIsRefused)
         EXPECT_TRUE(is_safe_host(host)) << host;
     }
     for (const std::string user : {"-l", "a b", "a:b", "a/b", "a&b", "a\"b"}) {
-        EXPECT_FALSE(is_safe_user("x", user)) << user;
+        EXPECT_FALSE(is_safe_rsync_user(user)) << user;
     }
-    EXPECT_TRUE(is_safe_user("x", "bk@example.org"));
+    EXPECT_TRUE(is_safe_rsync_user("bk@example.org"));
+    EXPECT_TRUE(is_safe_ssh_user("CORP/jd"));
+    EXPECT_FALSE(is_safe_ssh_user("ssh://x"));
+    EXPECT_EQ(shell_path_part("x", "-rf"), "-rf");
     EXPECT_TRUE(is_safe_port("873  "));
     EXPECT_FALSE(is_safe_port("8 73"));
     EXPECT_FALSE(is_safe_port("873;x"));

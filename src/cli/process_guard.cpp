@@ -29,7 +29,7 @@ bool holds_process_id(const std::string &path)
     const std::string_view content(text);
     pid_t pid = 0;
     const auto [end, error] = std::from_chars(content.data(), content.data() + content.size(), pid);
-    return error == std::errc() && pid > 0 && std::string_view(end) == "\n";
+    return error == std::errc() && pid > 0 && (*end == '\0' || std::string_view(end) == "\n");
 }
 
 } // namespace

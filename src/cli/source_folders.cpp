@@ -81,13 +81,13 @@ bool fill_buffers(const std::string &remote_backup_root, const char *share, cons
 
 void rsync_split_folders(RsyncJob &job, FolderTable &table)
 {
-    const bool maybe_cut = std::strlen(job.local_path) == sizeof job.local_path - 1;
-    if (maybe_cut) {
+    const bool cut = was_cut(job, "local_path");
+    if (cut) {
         char *const last = std::strrchr(job.local_path, ':');
         (last == nullptr ? job.local_path[0] : *last) = '\0';
     }
     rsync_split_list(job.local_path, ":", table);
-    if (maybe_cut) ++table.left_out;
+    if (cut) ++table.left_out;
 }
 
 int rsync_resolve_folder(const std::string &remote_backup_root, const std::string &folder)

@@ -22,7 +22,7 @@ extern char share_subdir[PATH_SIZE];     // the folder's place below the share: 
 inline constexpr std::size_t SERIAL_SIZE = 128;
 
 // Splits the job's `local_path` into the table, in place. Folders that the table cannot hold, and a last one
-// that the store may have cut, are counted as left out.
+// that the store had to cut, are counted as left out.
 void rsync_split_folders(RsyncJob &job, FolderTable &table);
 
 // Finds the first share that holds the folder, fills the three buffers and changes the working directory to

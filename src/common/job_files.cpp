@@ -51,7 +51,7 @@ std::string remote_config_copy(std::string_view job_name)
     return named_after("/tmp/remote_rshareinfo_", job_name, ".txt");
 }
 
-std::string snapshot_name(std::string_view job_name, int number)
+std::string snapshot_name(std::string_view job_name, std::int64_t number)
 {
     return snapshot_prefix(job_name) + std::to_string(number);
 }

@@ -3,6 +3,7 @@
 // Every name that the module gives to a file, built and recognised here alone. The functions take a job name
 // that is_job_name (shell_text.h) accepts; paths are not escaped for the shell.
 
+#include <cstdint>
 #include <string>
 #include <string_view>
 
@@ -28,7 +29,7 @@ inline constexpr const char *DISCOVERY_CONFIG_COPY = "/tmp/remote_rinfo.txt";
 
 // Name of a snapshot folder inside the job's local folder: the job's name (or "backup") and the number, 0 the
 // newest, with a full stop between them.
-std::string snapshot_name(std::string_view job_name, int number);
+std::string snapshot_name(std::string_view job_name, std::int64_t number);
 
 // Whether a folder entry is a snapshot of the job by its name alone: anything may follow the full stop.
 bool is_snapshot_name(std::string_view job_name, std::string_view entry);

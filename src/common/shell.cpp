@@ -8,7 +8,6 @@
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
-#include <sys/prctl.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -47,11 +46,8 @@ private:
 };
 
 // In the child: never returns. `output` below 0 keeps the program's own standard output.
-[[noreturn]] void become_shell(const char *command, int output, pid_t runner)
+[[noreturn]] void become_shell(const char *command, int output)
 {
-    // A command must not go on when its runner is gone.
-    prctl(PR_SET_PDEATHSIG, SIGKILL);
-    if (getppid() != runner) _exit(127);
     std::signal(SIGPIPE, SIG_DFL);
     const int nothing = open("/dev/null", O_RDONLY | O_CLOEXEC);
     if (nothing >= 0) dup2(nothing, STDIN_FILENO);
@@ -76,12 +72,11 @@ int wait_for(pid_t child)
 int run_shell(const std::string &command)
 {
     std::fflush(stdout);
-    const pid_t runner = getpid();
     const IgnoreInterrupts ignore;
     const pid_t child = fork();
     if (child == 0) {
         ignore.restore();
-        become_shell(command.c_str(), -1, runner);
+        become_shell(command.c_str(), -1);
     }
     return child < 0 ? -1 : wait_for(child);
 }
@@ -93,9 +88,8 @@ ShellReader::ShellReader(const std::string &command)
     if (pipe2(ends, O_CLOEXEC) != 0) return;
     UniqueFd reading(ends[0]);
     const UniqueFd writing(ends[1]);
-    const pid_t runner = getpid();
     child_ = fork();
-    if (child_ == 0) become_shell(command.c_str(), writing.get(), runner);
+    if (child_ == 0) become_shell(command.c_str(), writing.get());
     if (child_ < 0) return;
     output_.reset(fdopen(reading.get(), "r"));
     if (output_) reading.release();

@@ -64,12 +64,15 @@ bool is_job_name(std::string_view name)
 
 std::optional<std::string> shell_path(const char *field, std::string_view path)
 {
+    if (!path.starts_with('-')) return shell_path_part(field, path);
+    refused(field, "begins with an option's dash");
+    return std::nullopt;
+}
+
+std::optional<std::string> shell_path_part(const char *field, std::string_view path)
+{
     if (holds_control(path) || holds_any(path, LEFT_TO_THE_SHELL)) {
         refused(field, "character special to the shell");
-        return std::nullopt;
-    }
-    if (path.starts_with('-')) {
-        refused(field, "begins with an option's dash");
         return std::nullopt;
     }
     std::string escaped = escape_path(path);
@@ -105,9 +108,14 @@ bool is_safe_host(std::string_view remote_ip)
     return is_safe_name("remote_ip", remote_ip, "/@");
 }
 
-bool is_safe_user(const char *field, std::string_view user)
+bool is_safe_rsync_user(std::string_view user)
 {
-    return is_safe_name(field, user, "/:");
+    return is_safe_name("rsync_user", user, "/:");
+}
+
+bool is_safe_ssh_user(std::string_view user)
+{
+    return is_safe_name("ssh_user", user, ":");
 }
 
 bool is_safe_port(std::string_view port)

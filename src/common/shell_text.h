@@ -15,9 +15,11 @@ namespace bakjob
 // character and nothing that escape_path would leave to the shell.
 bool is_job_name(std::string_view name);
 
-// A path as a word of a command: escaped once. Refused when it holds a character that the escaping leaves to
-// the shell, begins with "-" (an option), or does not fit PATH_SIZE when escaped. `field` names it in the
-// trace.
+// A path as part of a word of a command: escaped once. Refused when it holds a character that the escaping
+// leaves to the shell, or does not fit PATH_SIZE when escaped. `field` names it in the trace.
+std::optional<std::string> shell_path_part(const char *field, std::string_view path);
+
+// A path as a whole word: also refused when it begins with "-", as an option does.
 std::optional<std::string> shell_path(const char *field, std::string_view path);
 
 // Whether a path holds nothing that any shell acts on, blanks included: for commands that the shell of the
@@ -34,7 +36,8 @@ std::string grep_word(std::string_view job_name);
 // Whether a host or user name may stand in a command as it is: no blank, no control character, nothing that
 // the shell acts on, no leading "-", nothing that would end the name for rsync or ssh.
 bool is_safe_host(std::string_view remote_ip);
-bool is_safe_user(const char *field, std::string_view user);
+bool is_safe_rsync_user(std::string_view user);
+bool is_safe_ssh_user(std::string_view user);
 
 // Whether a port text may stand in a command: nothing that the shell acts on, blanks only at its end.
 bool is_safe_port(std::string_view port);

@@ -23,7 +23,7 @@ bool is_trimmed(char c)
 
 bool copy_text(char *field, std::size_t size, std::string_view source)
 {
-    if (source.size() >= size || contains(source, {"", 1})) return false;
+    if (source.size() >= size || source.find('\0') != std::string_view::npos) return false;
     std::memmove(field, source.data(), source.size());
     field[source.size()] = '\0';
     return true;

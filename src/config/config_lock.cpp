@@ -14,15 +14,23 @@ namespace bakjob
 namespace
 {
 
-// The lock file lies where others may write. What is not a file of our own could keep us waiting for ever, so
-// it is replaced.
+UniqueFd open_regular(const char *path)
+{
+    UniqueFd file(open(path, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+    struct stat status = {};
+    if (file && (fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode))) file.reset();
+    return file;
+}
+
+// The lock file lies where others may write. A link or a pipe of that name is nobody's lock: it is replaced.
 UniqueFd open_lock_file(const char *path)
 {
-    UniqueFd file = open_own_file(path, O_RDONLY);
+    UniqueFd file = open_regular(path);
     if (file) return file;
-    if (errno == EPERM || errno == ELOOP || errno == ENXIO) unlink(path);
-    file = create_file(path, 0600);
-    return file ? std::move(file) : open_own_file(path, O_RDONLY);
+    struct stat status = {};
+    if (lstat(path, &status) == 0 && !S_ISREG(status.st_mode)) unlink(path);
+    file = create_file(path, 0644);
+    return file ? std::move(file) : open_regular(path);
 }
 
 bool is_still_at(const char *path, int file)

@@ -30,16 +30,16 @@ constexpr std::array FIELDS = {
     JobField{INTEGER(retry_interval), .lowest = 1, .highest = 180, .otherwise = 30},
     JobField{INTEGER(rsync_timeout), .lowest = 0, .highest = INT_MAX, .otherwise = 600},
     JobField{TEXT(last_do_job_time)},
-    JobField{TEXT(job_name)},
-    JobField{TEXT(rsync_user)},
-    JobField{TEXT(rsync_pwd)},
-    JobField{TEXT(ssh_user)},
-    JobField{TEXT(ssh_pwd)},
-    JobField{TEXT(port)},
-    JobField{TEXT(remote_ip)},
-    JobField{TEXT(remote_path)},
+    JobField{TEXT(job_name), .in_commands = true},
+    JobField{TEXT(rsync_user), .in_commands = true},
+    JobField{TEXT(rsync_pwd), .in_commands = true},
+    JobField{TEXT(ssh_user), .in_commands = true},
+    JobField{TEXT(ssh_pwd), .in_commands = true},
+    JobField{TEXT(port), .in_commands = true},
+    JobField{TEXT(remote_ip), .in_commands = true},
+    JobField{TEXT(remote_path), .in_commands = true},
     JobField{TEXT(local_path)},
-    JobField{TEXT(rsync_pwd_file)},
+    JobField{TEXT(rsync_pwd_file), .in_commands = true},
     JobField{TEXT(user_description)},
     JobField{INTEGER(rstate)},
     JobField{TEXT(rlast_do_job_time)},
@@ -76,6 +76,22 @@ const char *text_field(const RsyncJob &job, const JobField &field)
     return text_field(const_cast<RsyncJob &>(job), field);
 }
 
+const char *cut_command_field(const RsyncJob &job)
+{
+    for (const JobField &field : FIELDS) {
+        if (field.in_commands && was_cut(job, field.key)) return field.key;
+    }
+    return nullptr;
+}
+
+bool was_cut(const RsyncJob &job, std::string_view key)
+{
+    for (std::size_t i = 0; i < FIELDS.size(); ++i) {
+        if (key == FIELDS[i].key) return (job.cut_fields >> i & 1U) != 0;
+    }
+    return false;
+}
+
 void rsync_copy_job(RsyncJob &destination, const RsyncJob &source)
 {
     for (const JobField &field : FIELDS) {
@@ -85,6 +101,7 @@ void rsync_copy_job(RsyncJob &destination, const RsyncJob &source)
             copy_text(text_field(destination, field), field.size, text_field(source, field));
         }
     }
+    destination.cut_fields = source.cut_fields;
 }
 
 int snapshots_kept(int inc_number)

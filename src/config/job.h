@@ -9,6 +9,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <span>
+#include <string_view>
 
 namespace bakjob
 {
@@ -53,6 +54,7 @@ struct RsyncJob {
     char rlast_do_job_time[32];
     char in_remote_cloud_fqdn[32];
     RsyncJob *next;
+    std::uint32_t cut_fields; // bit i: the store has more of the text job_fields()[i] than fits here
 };
 
 // One field of the record, in the order in which the store keeps the keys.
@@ -63,6 +65,7 @@ struct JobField {
     int lowest = INT_MIN; // an integer outside of lowest..highest is loaded as `otherwise`
     int highest = INT_MAX;
     int otherwise = 0;
+    bool in_commands = false; // a text that becomes part of a command or names a file
 };
 
 std::span<const JobField> job_fields();
@@ -71,6 +74,12 @@ std::int32_t &integer_field(RsyncJob &job, const JobField &field);
 char *text_field(RsyncJob &job, const JobField &field);
 const std::int32_t &integer_field(const RsyncJob &job, const JobField &field);
 const char *text_field(const RsyncJob &job, const JobField &field);
+
+// The key of a text that commands need whole and the store had to cut; null when there is none.
+const char *cut_command_field(const RsyncJob &job);
+
+// Whether the store had to cut the field of that key.
+bool was_cut(const RsyncJob &job, std::string_view key);
 
 // Copies every field but `next`.
 void rsync_copy_job(RsyncJob &destination, const RsyncJob &source);

@@ -32,6 +32,7 @@ void apply_defaults(RsyncJob &job)
         job.pwd_encoded = 0;
     }
     if (job.port[0] == '\0') copy_text(job.port, DEFAULT_PORT);
+    if (job.pwd_encoded != 0) job.pwd_encoded = 1;
     // An ssh password that arrived as base64 must not be encoded again with the default.
     if (job.pwd_encoded == 0) encode_passwords(job, job.use_ssh == 1 && !arrived_encoded);
 }

@@ -1,10 +1,12 @@
 #include "config/job_store.h"
 
 #include "common/job_files.h"
+#include "common/text.h"
 #include "config/job_list.h"
 #include "config/schedule.h"
 #include "platform/config_store.h"
 
+#include <algorithm>
 #include <cstdio>
 #include <cstring>
 
@@ -36,19 +38,31 @@ private:
     std::size_t length_;
 };
 
-void load_job(RsyncJob &job, int item)
+// Whether the store has anything of the item.
+bool load_job(RsyncJob &job, int item)
 {
     ItemPath path(item);
+    bool found = false;
+    std::uint32_t bit = 1;
     for (const JobField &field : job_fields()) {
         const char *const key = path.key(field.key);
         if (field.size == 0) {
             const int value = xml_get_int(key);
             const bool in_range = value >= field.lowest && value <= field.highest;
             integer_field(job, field) = in_range ? value : field.otherwise;
+            found |= value != -1;
         } else {
-            xml_get_str(key, static_cast<int>(field.size), text_field(job, field));
+            // One byte more than the field holds tells a full text from a cut one.
+            char text[sizeof job.local_path + 1] = "";
+            xml_get_str(key, static_cast<int>(field.size + 1), text);
+            const std::size_t length = std::strlen(text);
+            if (length == field.size) job.cut_fields |= bit;
+            copy_text(text_field(job, field), field.size, {text, std::min(length, field.size - 1)});
+            found |= length > 0;
         }
+        bit <<= 1;
     }
+    return found;
 }
 
 void save_job(const RsyncJob &job, int item)
@@ -72,8 +86,10 @@ void rsync_load_jobs()
     const int count = xml_get_int(JOB_COUNT);
     for (int item = 1; item <= count; ++item) {
         RsyncJob job{};
-        load_job(job, item);
-        rsync_list_add_job(job);
+        const bool found = load_job(job, item);
+        const bool added = rsync_list_add_job(job) == 1;
+        // Behind an item that is not there is none, whatever the count says.
+        if (!found && !added) break;
     }
 }
 

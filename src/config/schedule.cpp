@@ -17,15 +17,25 @@ constexpr const char *GROUP_NODE = "/system_mgr/crond/rsync";
 constexpr const char *ENTRY_COUNT = "/system_mgr/crond/rsync/count";
 constexpr const char *GROUP_COUNT = "/system_mgr/crond/list/count";
 constexpr std::size_t TEXT_SIZE = 256; // bytes of a group's name and of a command, terminator included
+constexpr int MOST_ENTRIES = 10'000;
 
 struct Group {
     int groups;            // number of groups that the scheduler has
     std::string name_path; // where the name of ours stands; empty: there is none
 };
 
+// A count beyond all reason is damage: nothing is walked, and nothing deleted.
+int bounded_count(const char *path)
+{
+    const int count = xml_get_int(path);
+    if (count <= MOST_ENTRIES) return count;
+    DebugLog("ERROR: [%s] refused: %d\n", path, count);
+    return 0;
+}
+
 Group find_group()
 {
-    Group group{xml_get_int(GROUP_COUNT), {}};
+    Group group{bounded_count(GROUP_COUNT), {}};
     for (int i = 1; i <= group.groups; ++i) {
         std::string path = format_text("/system_mgr/crond/list/name:%d", i);
         if (store_text(path, TEXT_SIZE) == GROUP) {
@@ -43,7 +53,7 @@ std::string entry_path(int entry)
 
 std::string entry_command(int entry)
 {
-    return store_text(entry_path(entry) + "/run", TEXT_SIZE);
+    return store_text(entry_path(entry) + "/run", TEXT_SIZE + 1);
 }
 
 void delete_entry(int entry, int entries_left)
@@ -59,10 +69,10 @@ void delete_group(const Group &group)
     xml_del(GROUP_NODE);
 }
 
-// A command that fills its buffer may have been cut before the name, so it is not judged.
+// A command that is longer than what is read of it may have been cut before the name, so it is not judged.
 bool is_kept(const std::string &command)
 {
-    return command.size() == TEXT_SIZE - 1 || rsync_schedule_names_job(command) == 1;
+    return command.size() == TEXT_SIZE || rsync_schedule_names_job(command) == 1;
 }
 
 int first_entry_holding(const char *job_name, int entries)
@@ -87,7 +97,7 @@ void rsync_prune_schedule()
 {
     const Group group = find_group();
     if (group.name_path.empty()) return;
-    const int entries = xml_get_int(ENTRY_COUNT);
+    const int entries = bounded_count(ENTRY_COUNT);
     int remaining = entries;
     int entry = 1; // the entries behind a deleted one move up to its number
     for (int visited = 0; visited < entries; ++visited) {
@@ -114,7 +124,7 @@ void rsync_remove_job_schedule(const char *job_name)
         return;
     }
     DebugLog("compare name = [%s]\n", job_name);
-    const int entries = xml_get_int(ENTRY_COUNT);
+    const int entries = bounded_count(ENTRY_COUNT);
     if (entries <= 0) return;
     const int entry = first_entry_holding(job_name, entries);
     if (entry == 0) {

@@ -8,7 +8,9 @@
 #include "config/current_job.h"
 #include "remote/ssh_login.h"
 
+#include <cerrno>
 #include <cstdio>
+#include <cstring>
 #include <fcntl.h>
 #include <unistd.h>
 
@@ -69,7 +71,10 @@ bool fetch_daemon_config(const std::string &local_copy)
     if (!command) return false;
     // The shell would write through a link of that name: with a file of ours in place nobody else can put
     // one.
-    if (!replace_file(local_copy, 0600, "")) return false;
+    if (!replace_file(local_copy, 0600, "")) {
+        DebugLog("ERROR: [%s]: %s\n", local_copy.c_str(), std::strerror(errno));
+        return false;
+    }
     DebugLog("[%s]\n", command->c_str());
     run_shell(*command);
     return wait_for_file(local_copy);

@@ -27,8 +27,8 @@ std::optional<std::string> module_list_command(const RsyncJob &job)
 std::optional<std::string> write_test_command(const RsyncJob &job, int direction)
 {
     if (job.remote_ip[0] == '\0' || !is_safe_host(job.remote_ip)) return std::nullopt;
-    if (!is_safe_user("rsync_user", job.rsync_user)) return std::nullopt;
-    const auto path = shell_path("remote_path", job.remote_path);
+    if (!is_safe_rsync_user(job.rsync_user)) return std::nullopt;
+    const auto path = shell_path_part("remote_path", job.remote_path);
     if (!path) return std::nullopt;
 
     const bool daemon = job.rsync_mode == RSYNC_MODE_DAEMON;

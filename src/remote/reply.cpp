@@ -46,7 +46,10 @@ RemoteReplyCode classify_reply_line(std::string_view line)
 
 RemoteReplyCode rsync_classify_reply(const std::string &command)
 {
-    if (!fits_command(command)) return REPLY_ERROR;
+    if (!fits_command(command)) {
+        DebugLog("ERROR: probe command refused: too long\n");
+        return REPLY_ERROR;
+    }
     const auto line = first_reply_line(command);
     if (!line) return REPLY_ERROR;
     DebugLog("--->[%s]\n", line->c_str());

@@ -43,7 +43,7 @@ std::optional<std::string> ssh_command(const RsyncJob &job, SshLogin login, std:
     if (login == SshLogin::as_client) {
         command += option + ' ' + six + host;
     } else {
-        if (!is_safe_user("ssh_user", job.ssh_user)) return std::nullopt;
+        if (!is_safe_ssh_user(job.ssh_user)) return std::nullopt;
         command += six + option + (option.empty() ? "" : " ") + job.ssh_user + '@' + host;
     }
     command += ' ';

@@ -112,6 +112,7 @@ int transfer_with_retries(const std::string &job_name, const RsyncJob &job, cons
 
 bool rsync_write_password_file()
 {
+    unlink(CurrentJob.rsync_pwd_file);
     char password[PASSWORD_SIZE] = "";
     const bool encoded = CurrentJob.pwd_encoded != 0;
     const bool wants_plain = CurrentJob.server_type == SERVER_ANY;
@@ -143,6 +144,10 @@ BackupResult rsync_run_backup(const std::string &job_name, RsyncJob &job)
     rsync_prepare_current_job(job);
     if (job.server_type != SERVER_SAME_KIND && job.server_type != SERVER_ANY) {
         DebugLog("ERROR: server_type refused: %d\n", job.server_type);
+        return BACKUP_FAILED;
+    }
+    if (const char *const field = cut_command_field(job)) {
+        DebugLog("ERROR: %s refused: too long\n", field);
         return BACKUP_FAILED;
     }
     if (job.use_ssh == 1 && ssh_test() != SSH_OK) return BACKUP_SSH_FAILED;

@@ -9,6 +9,7 @@
 #include "common/shell_text.h"
 #include "common/text.h"
 #include "config/current_job.h"
+#include "remote/ssh_login.h"
 
 namespace bakjob
 {
@@ -22,23 +23,27 @@ constexpr const char *EXCLUDES =
     " --exclude 'lost+found' --exclude 'Nas_Prog' --exclude 'Ajaxpf'  --exclude '.systemfile'"
     " --exclude 'P2P' --exclude 'aMule' --exclude '.!@$mmc' --exclude '.!@#$tarnelSync' --exclude '.zorv' ";
 
-// What may stand in the command unquoted.
+// Whether what stands in the command unquoted may stand there.
 bool is_safe(const RsyncJob &job)
 {
+    const bool named = CurrentJob.server_type != SERVER_SAME_KIND;
+    const bool daemon_user = named && job.rsync_mode == RSYNC_MODE_DAEMON;
+    const bool ssh_user = named && job.use_ssh == 1;
     return (job.job_name[0] == '\0' || is_job_name(job.job_name)) && is_safe_host(job.remote_ip) &&
-           is_safe_port(job.port) && is_safe_user("rsync_user", job.rsync_user) &&
-           (job.use_ssh != 1 || is_safe_user("ssh_user", job.ssh_user));
+           is_safe_port(job.port) && (!daemon_user || is_safe_rsync_user(job.rsync_user)) &&
+           (!ssh_user || is_safe_ssh_user(job.ssh_user));
 }
 
-// " -e ..." with the login; nothing when the password is no base64 text. The blanks are part of the format.
+// " -e ..." with the login; nothing when the password has no base64 form. The blanks are part of the format.
 std::optional<std::string> remote_shell(const RsyncJob &job)
 {
-    const bool as_client = CurrentJob.server_type == SERVER_SAME_KIND;
-    const char *const password = as_client ? CurrentJob.ssh_pwd : job.ssh_pwd;
+    const auto password = ssh_password(job);
+    if (!password) return std::nullopt;
     const bool with_password = CurrentJob.ssh_pwd[0] != '\0';
-    if (with_password && !is_base64("ssh_pwd", password)) return std::nullopt;
-    const std::string option = with_password ? format_text("-d \"%s\" ", password) : "";
-    if (as_client) return format_text(" -e '/usr/sbin/ssh %s -ax -c blowfish '", option.c_str());
+    const std::string option = with_password ? format_text("-d \"%s\" ", password->c_str()) : "";
+    if (CurrentJob.server_type == SERVER_SAME_KIND) {
+        return format_text(" -e '/usr/sbin/ssh %s -ax -c blowfish '", option.c_str());
+    }
     return format_text(" -e '/usr/sbin/ssh %s-ax -c blowfish -l %s'", option.c_str(), job.ssh_user);
 }
 
@@ -74,7 +79,7 @@ std::optional<std::string> options(const RsyncJob &job)
     return text;
 }
 
-std::string snapshot_path(const RsyncJob &job, int number)
+std::string snapshot_path(const RsyncJob &job, std::int64_t number)
 {
     return std::string(job.local_path) + '/' + snapshot_name(job.job_name, number);
 }
@@ -94,7 +99,7 @@ std::optional<std::string> rsync_build_command(const RsyncJob &job)
 {
     if (!is_safe(job)) return std::nullopt;
     const auto option_text = options(job);
-    const auto remote_path = shell_path("remote_path", job.remote_path);
+    const auto remote_path = shell_path_part("remote_path", job.remote_path);
     if (!option_text || !remote_path) return std::nullopt;
 
     // Only a directory, not a link to one, is copied by its contents.
@@ -103,7 +108,7 @@ std::optional<std::string> rsync_build_command(const RsyncJob &job)
     const bool pull = !recover && job.backup_type != BACKUP_PUSH;
     std::string local = job.local_path + slash;
     if (recover) {
-        local = snapshot_path(job, run_options.recover_seq - 1) + '/';
+        local = snapshot_path(job, std::int64_t{run_options.recover_seq} - 1) + '/';
     } else if (job.backup_type == BACKUP_PULL && job.inc_enable == 1) {
         local = snapshot_path(job, 0);
     }

@@ -49,16 +49,20 @@ void rsync_snapshot_rotate(const std::string &local_path, int inc_number, const 
 {
     if (local_path.empty()) return;
     const auto escaped = shell_path("local_path", local_path);
-    if (!escaped || (!job_name.empty() && !is_job_name(job_name))) return;
     const int top = snapshots_kept(inc_number) - 1;
+    const bool named = job_name.empty() || is_job_name(job_name);
+    // All of a rotation or nothing: without the copy of 0, the transfer would overwrite it.
+    if (!escaped || !named || !fits_command(rotation_command(*escaped, job_name, 0, top))) {
+        DebugLog("ERROR: snapshots refused: job_name or local_path\n");
+        return;
+    }
     for (int number = top; number >= 0; --number) {
         const std::string path = snapshot_path(local_path, job_name, number);
         DebugLog("[%s]\n", path.c_str());
         if (number == 0) copy_text(run_options.inc_root_path, path);
         if (access(path.c_str(), F_OK) != 0) continue;
-        const std::string command = rotation_command(*escaped, job_name, number, top);
-        if (!fits_command(command)) continue;
-        run_step(command, path, number == top ? "" : snapshot_path(local_path, job_name, number + 1));
+        run_step(rotation_command(*escaped, job_name, number, top), path,
+                 number == top ? "" : snapshot_path(local_path, job_name, number + 1));
     }
 }
 
