@@ -29,7 +29,8 @@ protected:
     {
         std::string all;
         const int count = std::max(0, std::atoi(store_get("/backup_mgr/rsync/count").c_str()));
-        for (int i = 1; i <= count; ++i) all += job_key(i, "job_name") + job_key(i, "enable") + " ";
+        for (int i = 1; i <= count; ++i)
+            all += job_key(i, "job_name") + job_key(i, "enable") + " ";
         return all;
     }
 
@@ -39,7 +40,8 @@ protected:
         store_set("/system_mgr/crond/list/name:1", "rsync");
         store_set("/system_mgr/crond/rsync/count", std::to_string(jobs.size()));
         for (std::size_t i = 0; i < jobs.size(); ++i) {
-            store_set("/system_mgr/crond/rsync/item:" + std::to_string(i + 1) + "/run", "bakjob -r '" + jobs[i] + "'");
+            store_set("/system_mgr/crond/rsync/item:" + std::to_string(i + 1) + "/run",
+                      "bakjob -r '" + jobs[i] + "'");
         }
         store_save();
     }
@@ -48,7 +50,8 @@ protected:
 TEST_F(Operations, EachIsAWholeCycleThatLeavesNoList)
 {
     EXPECT_EQ(rsync_job_exists("a"), 0);
-    for (const char *name : {"a", "b", "c"}) EXPECT_EQ(rsync_add_job(make_job(name)), 1);
+    for (const char *name : {"a", "b", "c"})
+        EXPECT_EQ(rsync_add_job(make_job(name)), 1);
     EXPECT_EQ(rsync_add_job(make_job("b")), 0);
     EXPECT_EQ(rsync_disable_job("b"), 1);
     EXPECT_EQ(names(), "a1 b0 c1 ");
@@ -58,8 +61,8 @@ TEST_F(Operations, EachIsAWholeCycleThatLeavesNoList)
     EXPECT_EQ(names(), "b1 c1 ");
     const std::string before = read_file("/etc/NAS_CFG/config.xml");
     RsyncJob untouched = make_job("mine");
-    for (const int result : {rsync_enable_job("x"), rsync_disable_job("x"), rsync_delete_job("x"), rsync_get_job(untouched, "x"),
-                             rsync_modify_job(make_job("y"), "x")}) {
+    for (const int result : {rsync_enable_job("x"), rsync_disable_job("x"), rsync_delete_job("x"),
+                             rsync_get_job(untouched, "x"), rsync_modify_job(make_job("y"), "x")}) {
         EXPECT_EQ(result, 0);
     }
     EXPECT_STREQ(untouched.job_name, "mine");
@@ -72,7 +75,8 @@ TEST_F(Operations, EachIsAWholeCycleThatLeavesNoList)
 
 TEST_F(Operations, RenamingOntoAnotherNameKeepsTheFirstAtTheNextLoad)
 {
-    for (const char *name : {"a", "b"}) rsync_add_job(make_job(name));
+    for (const char *name : {"a", "b"})
+        rsync_add_job(make_job(name));
     RsyncJob renamed = make_job("a");
     renamed.pwd_encoded = 0;
     copy_text(renamed.rsync_pwd, "plain");
@@ -112,7 +116,8 @@ TEST_F(Operations, SchedulerEntriesFollowTheJobs)
 
 TEST_F(Operations, OfEightProcessesAtOnceNoneIsLost)
 {
-    for (int i = 0; i < 8; ++i) rsync_add_job(make_job("kept" + std::to_string(i)));
+    for (int i = 0; i < 8; ++i)
+        rsync_add_job(make_job("kept" + std::to_string(i)));
     for (int i = 0; i < 8; ++i) {
         if (fork() != 0) continue;
         const std::string mine = std::to_string(i);
@@ -126,7 +131,8 @@ TEST_F(Operations, OfEightProcessesAtOnceNoneIsLost)
         _exit(failed);
     }
     int status = 0;
-    while (wait(&status) > 0) EXPECT_EQ(status, 0);
+    while (wait(&status) > 0)
+        EXPECT_EQ(status, 0);
     std::string all = names();
     for (int i = 0; i < 8; ++i) {
         EXPECT_NE(all.find("kept" + std::to_string(i) + "0 "), std::string::npos) << all;
@@ -142,7 +148,8 @@ class LocalPaths : public Appliance
 TEST_F(LocalPaths, VolumesAreFoundByTheirSharedNames)
 {
     const std::string long_word(64, 'w');
-    write_file("/etc/shared_name", "Volume_1 = HD_a2 /x\nVolume_2 = HD_b2 HD_a2\n" + long_word + " = HD_c2\n");
+    write_file("/etc/shared_name",
+               "Volume_1 = HD_a2 /x\nVolume_2 = HD_b2 HD_a2\n" + long_word + " = HD_c2\n");
     const Keys paths = {{"/mnt/HD/HD_a2/Public/x", "/Volume_1/Public/x"},
                         {"/mnt/HD/HD_b2/P", "/Volume_2/P"},
                         {"/mnt/HD/HD_a2", "/Volume_1/"},
@@ -153,10 +160,17 @@ TEST_F(LocalPaths, VolumesAreFoundByTheirSharedNames)
                         {"/mnt/HD/", ""},
                         {"/mnt/HD/HD", ""},
                         {"/mnt/HD/HD_a2/" + std::string(1020, 'x'), ""}};
-    for (const auto &[path, shared] : paths) EXPECT_EQ(rsync_shared_path(path), shared) << path;
-    const std::map<std::string, int> volumes = {{"/mnt/HD/HD_a2/Public", 1}, {"/mnt/HD/HD_a2", 1}, {"/mnt/HD/HD_x2/P", 0}, {"/mnt/HD", 0},
-                                                {"/mnt/HD/", 0},             {"/x/y/HD_b2", 1},    {"", 0}};
-    for (const auto &[path, is_shared] : volumes) EXPECT_EQ(rsync_volume_is_shared(path), is_shared) << path;
+    for (const auto &[path, shared] : paths)
+        EXPECT_EQ(rsync_shared_path(path), shared) << path;
+    const std::map<std::string, int> volumes = {{"/mnt/HD/HD_a2/Public", 1},
+                                                {"/mnt/HD/HD_a2", 1},
+                                                {"/mnt/HD/HD_x2/P", 0},
+                                                {"/mnt/HD", 0},
+                                                {"/mnt/HD/", 0},
+                                                {"/x/y/HD_b2", 1},
+                                                {"", 0}};
+    for (const auto &[path, is_shared] : volumes)
+        EXPECT_EQ(rsync_volume_is_shared(path), is_shared) << path;
     fs::remove("/etc/shared_name");
     EXPECT_STREQ(rsync_shared_path("/mnt/HD/HD_a2/x"), "");
     EXPECT_EQ(rsync_volume_is_shared("/mnt/HD/HD_a2/x"), 0);
@@ -198,16 +212,25 @@ TEST_F(Sizes, WordsOfRepliesAreJudged)
 {
     const std::string long_word(31, '7');
     const std::vector<std::pair<std::string, std::string>> lines = {
-        {"/dev/sda4 1.8T 1.2T 600G 67% /mnt/HD/HD_a2", "600G"}, {"  a\tb  c   d", "d"}, {"", "N/A"}, {"a b c", "N/A"},
-        {std::string(200, 'x') + " 1 2 3G 4", "3G"}, {"a b c " + long_word, long_word}, {"a b c " + long_word + "7", "N/A"}};
+        {"/dev/sda4 1.8T 1.2T 600G 67% /mnt/HD/HD_a2", "600G"},
+        {"  a\tb  c   d", "d"},
+        {"", "N/A"},
+        {"a b c", "N/A"},
+        {std::string(200, 'x') + " 1 2 3G 4", "3G"},
+        {"a b c " + long_word, long_word},
+        {"a b c " + long_word + "7", "N/A"}};
     for (const auto &[line, size] : lines) {
         SizeText text = "old";
         size_of_df_line(line, text);
         EXPECT_EQ(text, size) << line;
     }
-    const std::vector<std::pair<std::string, std::string>> replies = {
-        {"4.0K\t/x", "4.0K"}, {"0\t/x", "0"}, {"12k", "12k"}, {"3.5T\t/x", "N/A"}, {"42\t/x", "N/A"}, {"du: cannot access", "N/A"},
-        {std::string(40, '1') + "K", "N/A"}};
+    const std::vector<std::pair<std::string, std::string>> replies = {{"4.0K\t/x", "4.0K"},
+                                                                      {"0\t/x", "0"},
+                                                                      {"12k", "12k"},
+                                                                      {"3.5T\t/x", "N/A"},
+                                                                      {"42\t/x", "N/A"},
+                                                                      {"du: cannot access", "N/A"},
+                                                                      {std::string(40, '1') + "K", "N/A"}};
     for (const auto &[line, size] : replies) {
         SizeText text = "old";
         size_of_du_reply(line, text);
@@ -223,11 +246,13 @@ TEST_F(Sizes, WordsOfRepliesAreJudged)
 
 TEST_F(Sizes, RemoteCommandsAreExact)
 {
-    const std::string excludes =
-        " --exclude='.AppleDouble' --exclude='.AppleDB'  --exclude='.DS_Store' --exclude='.bin' --exclude='.AppleDesktop'  "
-        "--exclude=\\''Network Trash Folder'\\' --exclude=\\''.!@#$recycle'\\'  --exclude='lost+found' --exclude='Nas_Prog' "
-        "--exclude='Ajaxpf'  --exclude='.systemfile' --exclude='P2P' --exclude='aMule' --exclude=\\''.!@$mmc'\\' "
-        "--exclude=\\''.!@#$tarnelSync'\\' --exclude='.zorv' ";
+    const std::string excludes = " --exclude='.AppleDouble' --exclude='.AppleDB'  --exclude='.DS_Store' "
+                                 "--exclude='.bin' --exclude='.AppleDesktop'  "
+                                 "--exclude=\\''Network Trash Folder'\\' --exclude=\\''.!@#$recycle'\\'  "
+                                 "--exclude='lost+found' --exclude='Nas_Prog' "
+                                 "--exclude='Ajaxpf'  --exclude='.systemfile' --exclude='P2P' "
+                                 "--exclude='aMule' --exclude=\\''.!@$mmc'\\' "
+                                 "--exclude=\\''.!@#$tarnelSync'\\' --exclude='.zorv' ";
     struct Case {
         int server;
         bool has_du;
@@ -275,7 +300,8 @@ TEST_F(Sizes, HostileFoldersAreNeverSent)
 {
     write_file("/tmp/reply", "5M\t/m\n");
     CurrentJob.server_type = 2;
-    for (const char *folder : {"/a b", "/a;reboot", "/$(reboot)", "/`reboot`", "/a'b", "/a&b", "/a|b", "/a>b", "/a\nb", "/a\"b", "/*", "-x", "/a\\b"}) {
+    for (const char *folder : {"/a b", "/a;reboot", "/$(reboot)", "/`reboot`", "/a'b", "/a&b", "/a|b", "/a>b",
+                               "/a\nb", "/a\"b", "/*", "-x", "/a\\b"}) {
         SizeText size = "old";
         rsync_remote_du(folder, size);
         EXPECT_STREQ(size, "N/A") << folder;
@@ -298,7 +324,9 @@ TEST_F(Sizes, LocalFoldersAreAddedUp)
     char folders[] = "/mnt/HD/HD_a2/My Photos:/mnt/HD/HD_a2/b";
     SizeText size = "";
     rsync_local_du(folders, size);
-    const std::string total = shell("/usr/bin/du -shc --exclude=lost+found '/mnt/HD/HD_a2/My Photos' /mnt/HD/HD_a2/b | tail -1").output;
+    const std::string total =
+        shell("/usr/bin/du -shc --exclude=lost+found '/mnt/HD/HD_a2/My Photos' /mnt/HD/HD_a2/b | tail -1")
+            .output;
     EXPECT_EQ(size, total.substr(0, total.find('\t')));
     EXPECT_EQ(std::string(size).back(), 'M');
     EXPECT_STREQ(folders, "/mnt/HD/HD_a2/My Photos");
@@ -335,7 +363,7 @@ TEST_F(Sizes, ModulesAreReadFromTheRemoteConfiguration)
     CurrentJob.backup_type = 1;
     for (const Case &one : cases) {
         write_file("/tmp/config", one.config);
-        write_file("/tmp/reply", "x 1 2 3G y\n");
+        write_file("/tmp/reply", "x 1 2 3G HD_d2\n");
         rsync_discover_remote();
         std::string modules;
         for (const RemoteModule *module = module_list->head; module != nullptr; module = module->next) {
@@ -379,8 +407,8 @@ TEST_F(Sizes, ACopyThatNeverAppearsEndsTheDiscovery)
 TEST_F(Sizes, DaemonListingsBecomeModulesLineByLine)
 {
     const Fake rsync("/usr/sbin/rsync", "cat /tmp/listing; exit 3\n");
-    write_file("/tmp/listing", "home           \tHomes\ndata\t\nhome\tagain\nno tab\n\n" + std::string(5000, 'x') + "\tlong\n" +
-                                   std::string(128, 'n') + "\n");
+    write_file("/tmp/listing", "home           \tHomes\ndata\t\nhome\tagain\nno tab\n\n" +
+                                   std::string(5000, 'x') + "\tlong\n" + std::string(128, 'n') + "\n");
     EXPECT_EQ(rsync_list_daemon_modules(), 3);
     testing::internal::CaptureStdout();
     rsync_print_modules();
@@ -411,8 +439,12 @@ TEST_F(Sizes, DaemonListingsBecomeModulesLineByLine)
 TEST_F(Sizes, ARemoteSecretIsComparedAsBase64)
 {
     const std::map<std::string, RemoteReplyCode> secrets = {
-        {"root:c2VjcmV0\n", REPLY_OK},          {"root:secret\n", REPLY_AUTH_FAILED}, {"root:c2VjcmV0x\n", REPLY_AUTH_FAILED},
-        {"bk:x\nroot:c2VjcmV0\n", REPLY_OK},    {"", REPLY_AUTH_FAILED},              {"bk:c2VjcmV0\n", REPLY_AUTH_FAILED},
+        {"root:c2VjcmV0\n", REPLY_OK},
+        {"root:secret\n", REPLY_AUTH_FAILED},
+        {"root:c2VjcmV0x\n", REPLY_AUTH_FAILED},
+        {"bk:x\nroot:c2VjcmV0\n", REPLY_OK},
+        {"", REPLY_AUTH_FAILED},
+        {"bk:c2VjcmV0\n", REPLY_AUTH_FAILED},
         {"root:other\nroot:c2VjcmV0\n", REPLY_AUTH_FAILED}};
     for (const int encoded : {1, 0}) {
         CurrentJob.pwd_encoded = encoded;
@@ -440,7 +472,8 @@ TEST_F(RealRemoteSide, IsDiscovered)
     write_file("/remote/backup/f", std::string(3'000'000, 'x'));
     const auto names = [] {
         std::string all;
-        for (const RemoteModule *m = module_list->head; m != nullptr; m = m->next) all += m->name + std::string(":") + m->path + " ";
+        for (const RemoteModule *m = module_list->head; m != nullptr; m = m->next)
+            all += m->name + std::string(":") + m->path + " ";
         return all;
     };
     EXPECT_EQ(rsync_list_daemon_modules(), 0);
