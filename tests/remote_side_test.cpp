@@ -12,7 +12,7 @@ protected:
     void SetUp() override
     {
         Appliance::SetUp();
-        fs::remove_all("/root/.ssh/known_hosts");
+        shell("rm -f ~root/.ssh/known_hosts");
         add_share("Public", SHARE);
         write_file("/tmp/kv_serial.txt", "S1");
     }
@@ -148,8 +148,8 @@ TEST_F(RemoteSide, AChangedHostKeyIsRepaired)
     add_job({{"use_ssh", "1"}, {"rsync_mode", "1"}, {"remote_path", "/remote/data"}, {"ssh_pwd", "rootpw"}});
     fs::create_directories("/remote/data/S1_remote_backup/daily");
     write_file(std::string(SHARE) + "/file", "x");
-    shell("mkdir -p /root/.ssh && ssh-keygen -q -t ed25519 -N '' -f /tmp/other && "
-          "echo 127.0.0.1 $(cat /tmp/other.pub) >/root/.ssh/known_hosts");
+    shell("mkdir -p ~root/.ssh && ssh-keygen -q -t ed25519 -N '' -f /tmp/other && "
+          "echo 127.0.0.1 $(cat /tmp/other.pub) >~root/.ssh/known_hosts");
     run("-r daily");
     expect_state(1, "2");
     EXPECT_NE(trace_.find("--->##### SERVER SSH key changed!"), std::string::npos) << trace_;

@@ -36,30 +36,30 @@ TEST_F(Folders, LieInTheFirstShareThatHoldsThem)
     };
     const std::string base = "/mnt/HD/HD_a2/Public";
     const std::vector<Case> cases = {
-        {base, 0, "/root/Public", "/"},
-        {base + "/x/y", 0, "/root/Public", "/x/y"},
-        {base + "/x/f.txt", 0, "/root/Public", "/x"},
-        {base + "/g.txt", 0, "/root/Public", "/"},
-        {base + "/x/link", 0, "/root/Public", "/x"},
-        {base + "/missing/z", 0, "/root/Public", "/missing"},
-        {base + "/inner", 0, "/root/Public", "/inner"},
-        {base + "2", 0, "/root/Public2", "/"},
+        {base, 0, "/base/Public", "/"},
+        {base + "/x/y", 0, "/base/Public", "/x/y"},
+        {base + "/x/f.txt", 0, "/base/Public", "/x"},
+        {base + "/g.txt", 0, "/base/Public", "/"},
+        {base + "/x/link", 0, "/base/Public", "/x"},
+        {base + "/missing/z", 0, "/base/Public", "/missing"},
+        {base + "/inner", 0, "/base/Public", "/inner"},
+        {base + "2", 0, "/base/Public2", "/"},
         {base + "23", -1, "", ""},
         {"/mnt/HD/HD_a2", -1, "", ""},
         {base + "/../../../etc", -1, "", ""},
         {base + "/x/..", -1, "", ""},
-        {"/mnt/HD/HD_a2/Gone/x", -1, "/root/Gone", "/"},
+        {"/mnt/HD/HD_a2/Gone/x", -1, "/base/Gone", "/"},
     };
     for (const Case &one : cases) {
         fs::current_path("/");
-        EXPECT_EQ(rsync_resolve_folder("/root", one.folder), one.result) << one.folder;
+        EXPECT_EQ(rsync_resolve_folder("/base", one.folder), one.result) << one.folder;
         EXPECT_EQ(share_remote_dir, one.remote) << one.folder;
         EXPECT_EQ(share_subdir, one.subdir) << one.folder;
         EXPECT_EQ(fs::current_path() == share_path, one.result == 0);
     }
     EXPECT_EQ(rsync_resolve_folder(std::string(1020, 'r'), base), -1) << "a cut remote folder is another one";
     Appliance::SetUp();
-    EXPECT_EQ(rsync_resolve_folder("/root", base), -1) << "no shares at all";
+    EXPECT_EQ(rsync_resolve_folder("/base", base), -1) << "no shares at all";
 }
 
 TEST_F(Folders, AListIsSplitAndWhatDoesNotFitIsCounted)

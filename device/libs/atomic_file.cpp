@@ -58,17 +58,6 @@ void remove_leftovers(const std::string &folder, const std::string &start)
     }
 }
 
-bool write_whole(int fd, std::string_view contents)
-{
-    while (!contents.empty()) {
-        const ssize_t written = write(fd, contents.data(), contents.size());
-        if (written < 0 && errno == EINTR) continue;
-        if (written < 0) return false;
-        contents.remove_prefix(static_cast<std::size_t>(written));
-    }
-    return true;
-}
-
 // The rename is on disk only when the folder is. A failure here cannot be undone, nor does it make the new
 // file a wrong one, so it is nobody's failure.
 void sync_folder(const std::string &folder)
@@ -88,7 +77,7 @@ UniqueFd replace_file(const std::string &path, std::string_view contents, mode_t
     const std::string temporary = path + std::string(TEMPORARY_MARK) + std::to_string(getpid());
     UniqueFd fd(open(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600));
     if (!fd) return {};
-    const bool replaced = fchmod(fd.get(), mode) == 0 && write_whole(fd.get(), contents) &&
+    const bool replaced = fchmod(fd.get(), mode) == 0 && bakjob::write_all(fd.get(), contents) &&
                           fsync(fd.get()) == 0 && std::rename(temporary.c_str(), path.c_str()) == 0;
     if (!replaced) {
         const int reason = errno;

@@ -1,9 +1,11 @@
 #pragma once
 
-// Owners of what the system hands out: they close it when they go.
+// Owners of what the system hands out: they close it when they go. And a write that writes.
 
+#include <cerrno>
 #include <cstdio>
 #include <memory>
+#include <string_view>
 #include <unistd.h>
 #include <utility>
 
@@ -41,5 +43,17 @@ struct CloseFile {
     void operator()(std::FILE *file) const { std::fclose(file); }
 };
 using UniqueFile = std::unique_ptr<std::FILE, CloseFile>;
+
+// Writes everything, however many calls it takes; false (errno) on failure.
+inline bool write_all(int fd, std::string_view contents)
+{
+    while (!contents.empty()) {
+        const ssize_t written = write(fd, contents.data(), contents.size());
+        if (written < 0 && errno == EINTR) continue;
+        if (written < 0) return false;
+        contents.remove_prefix(static_cast<std::size_t>(written));
+    }
+    return true;
+}
 
 } // namespace bakjob

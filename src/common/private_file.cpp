@@ -48,15 +48,4 @@ bool is_directory(const std::string &path)
     return lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
 }
 
-bool write_all(int fd, std::string_view contents)
-{
-    while (!contents.empty()) {
-        const ssize_t written = write(fd, contents.data(), contents.size());
-        if (written < 0 && errno == EINTR) continue;
-        if (written < 0) return false;
-        contents.remove_prefix(static_cast<std::size_t>(written));
-    }
-    return true;
-}
-
 } // namespace bakjob

@@ -27,7 +27,4 @@ UniqueFd open_own_file(const std::string &path, int flags);
 // Whether a folder stands at `path` itself, not behind a link.
 bool is_directory(const std::string &path);
 
-// Writes everything, however many calls it takes; false (errno) on failure.
-bool write_all(int fd, std::string_view contents);
-
 } // namespace bakjob
