@@ -306,8 +306,12 @@ TEST_F(Sizes, HostileFoldersAreNeverSent)
         rsync_remote_du(folder, size);
         EXPECT_STREQ(size, "N/A") << folder;
     }
+    SizeText size = "7G";
+    copy_text(CurrentJob.ssh_user, "a b");
+    rsync_remote_du("/m", size);
+    EXPECT_STREQ(size, "N/A") << "a refused login is no earlier text";
+    copy_text(CurrentJob.ssh_user, "me");
     EXPECT_FALSE(exists("/tmp/calls"));
-    SizeText size = "";
     rsync_remote_du("/100%+x=y", size);
     EXPECT_STREQ(size, "5M");
     CurrentJob.remote_ip[0] = '\0';
@@ -407,9 +411,9 @@ TEST_F(Sizes, ACopyThatNeverAppearsEndsTheDiscovery)
 TEST_F(Sizes, DaemonListingsBecomeModulesLineByLine)
 {
     const Fake rsync("/usr/sbin/rsync", "cat /tmp/listing; exit 3\n");
-    write_file("/tmp/listing", "home           \tHomes\ndata\t\nhome\tagain\nno tab\n\n" +
+    write_file("/tmp/listing", "home           \tHomes\ndata\t\nhome\tagain\nno tab\n\tcomment only\n\n" +
                                    std::string(5000, 'x') + "\tlong\n" + std::string(128, 'n') + "\n");
-    EXPECT_EQ(rsync_list_daemon_modules(), 3);
+    EXPECT_EQ(exit_code(rsync_list_daemon_modules()), 3);
     testing::internal::CaptureStdout();
     rsync_print_modules();
     std::string printed;

@@ -9,7 +9,7 @@
 namespace bakjob
 {
 
-// Makes a folder, with those above it, open to every user. The exit code of the command; -1 for an empty or
+// Makes a folder, with those above it, open to every user. The wait status of the command; -1 for an empty or
 // refused path.
 int rsync_make_dir(const std::string &path);
 

@@ -23,7 +23,7 @@ int rsync_remove_pid_file(const std::string &job_name);
 std::string rsync_ps_command();
 
 // Kills the process that the pid file names, and notes in `restore_mode` whether it was a restore run. The
-// kill command's exit code; -1 without a pid file or when it holds no process id.
+// kill command's wait status, 0 for success; -1 without a pid file or when it holds no process id.
 int rsync_kill_job_process(const std::string &job_name);
 
 // Kills every rsync process whose command line holds "job-name=" followed by the name.

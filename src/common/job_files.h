@@ -26,6 +26,7 @@ std::string transfer_size_file(std::string_view job_name);
 // Local copy of the remote daemon's configuration.
 std::string remote_config_copy(std::string_view job_name);
 inline constexpr const char *DISCOVERY_CONFIG_COPY = "/tmp/remote_rinfo.txt";
+inline constexpr const char *DISCOVERY_LOCK_FILE = "/tmp/remote_rinfo.lock";
 
 // Name of a snapshot folder inside the job's local folder: the job's name (or "backup") and the number, 0 the
 // newest, with a full stop between them.

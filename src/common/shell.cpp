@@ -17,7 +17,7 @@ namespace bakjob
 namespace
 {
 
-constexpr std::size_t FIRST_LINE_LENGTH = 1023;
+constexpr std::size_t REPLY_LENGTH = 1023;
 
 // While a command runs, an interrupt from the terminal is for the command alone.
 class IgnoreInterrupts
@@ -64,10 +64,16 @@ int wait_for(pid_t child)
     while (waitpid(child, &status, 0) < 0) {
         if (errno != EINTR) return -1;
     }
-    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+    return status;
 }
 
 } // namespace
+
+int exit_code(int status)
+{
+    if (status == -1) return -1;
+    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+}
 
 int run_shell(const std::string &command)
 {
@@ -113,7 +119,7 @@ int ShellReader::close()
     return status;
 }
 
-std::optional<std::string> first_reply_line(const std::string &command)
+std::optional<std::string> first_line(const std::string &command)
 {
     ShellReader reply(command);
     if (!reply.started()) return std::nullopt;
@@ -123,9 +129,18 @@ std::optional<std::string> first_reply_line(const std::string &command)
     while (reply.read_line(rest)) {
     }
     reply.close();
-    first.resize(std::min(first.size(), FIRST_LINE_LENGTH));
     trim_right(first);
     return first;
+}
+
+std::optional<std::string> first_reply_line(const std::string &command)
+{
+    auto line = first_line(command);
+    if (line && line->size() > REPLY_LENGTH) {
+        line->resize(REPLY_LENGTH);
+        trim_right(*line);
+    }
+    return line;
 }
 
 } // namespace bakjob

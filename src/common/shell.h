@@ -22,9 +22,11 @@ inline bool fits_command(const std::string &command)
     return command.size() < COMMAND_SIZE;
 }
 
-// Runs the command and waits. Its exit code; 128 and the signal's number when a signal ended it; -1 when it
-// could not be started.
+// Runs the command and waits. Its wait status, 0 for success; -1 when it could not be started.
 int run_shell(const std::string &command);
+
+// The exit code in a wait status; 128 and the signal's number when a signal ended the command; -1 of -1.
+int exit_code(int status);
 
 // A command whose output is read line by line.
 class ShellReader
@@ -41,7 +43,7 @@ public:
     // The next line (read_line of text.h); false at the end.
     bool read_line(std::string &line);
 
-    // Stops reading and waits; the result of run_shell.
+    // Stops reading and waits. The command's wait status, -1 when it could not be started.
     int close();
 
 private:
@@ -49,8 +51,11 @@ private:
     pid_t child_ = -1;
 };
 
-// The first line (at most 1023 bytes) of the command's output without trailing white space; the rest is read
-// and thrown away, so the command always runs to its end. Nothing when it could not be started.
+// The first line of the command's output without trailing white space; the rest is read and thrown away, so
+// the command always runs to its end. Nothing when it could not be started.
+std::optional<std::string> first_line(const std::string &command);
+
+// The same, of a long line only the first 1023 bytes: what probes are judged by.
 std::optional<std::string> first_reply_line(const std::string &command);
 
 } // namespace bakjob

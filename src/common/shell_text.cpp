@@ -64,8 +64,8 @@ bool is_job_name(std::string_view name)
 
 std::optional<std::string> shell_path(const char *field, std::string_view path)
 {
-    if (!path.starts_with('-')) return shell_path_part(field, path);
-    refused(field, "begins with an option's dash");
+    if (!path.starts_with('-') && !path.starts_with('~')) return shell_path_part(field, path);
+    refused(field, "begins with a dash or a tilde");
     return std::nullopt;
 }
 

@@ -19,7 +19,8 @@ bool is_job_name(std::string_view name);
 // leaves to the shell, or does not fit PATH_SIZE when escaped. `field` names it in the trace.
 std::optional<std::string> shell_path_part(const char *field, std::string_view path);
 
-// A path as a whole word: also refused when it begins with "-", as an option does.
+// A path as a whole word: also refused when it begins with "-", as an option does, or with "~", which the
+// shell replaces there.
 std::optional<std::string> shell_path(const char *field, std::string_view path);
 
 // Whether a path holds nothing that any shell acts on, blanks included: for commands that the shell of the

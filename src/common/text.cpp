@@ -49,7 +49,11 @@ bool read_line(std::FILE *file, std::string &line)
     int c = std::getc(file);
     if (c == EOF) return false;
     for (; c != EOF && c != '\n'; c = std::getc(file)) {
-        if (line.size() < LINE_LENGTH) line += static_cast<char>(c);
+        if (line.size() < LINE_LENGTH) {
+            line += static_cast<char>(c);
+        } else {
+            line.back() = '?'; // nobody may trim the line to a shorter one
+        }
     }
     return true;
 }

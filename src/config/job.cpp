@@ -1,5 +1,6 @@
 #include "config/job.h"
 
+#include "common/debug_log.h"
 #include "common/text.h"
 
 #include <algorithm>
@@ -76,12 +77,14 @@ const char *text_field(const RsyncJob &job, const JobField &field)
     return text_field(const_cast<RsyncJob &>(job), field);
 }
 
-const char *cut_command_field(const RsyncJob &job)
+bool has_whole_texts(const RsyncJob &job)
 {
     for (const JobField &field : FIELDS) {
-        if (field.in_commands && was_cut(job, field.key)) return field.key;
+        if (!field.in_commands || !was_cut(job, field.key)) continue;
+        DebugLog("ERROR: %s refused: too long\n", field.key);
+        return false;
     }
-    return nullptr;
+    return true;
 }
 
 bool was_cut(const RsyncJob &job, std::string_view key)

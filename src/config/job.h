@@ -75,8 +75,8 @@ char *text_field(RsyncJob &job, const JobField &field);
 const std::int32_t &integer_field(const RsyncJob &job, const JobField &field);
 const char *text_field(const RsyncJob &job, const JobField &field);
 
-// The key of a text that commands need whole and the store had to cut; null when there is none.
-const char *cut_command_field(const RsyncJob &job);
+// False, with a trace, when a text that commands need was cut.
+bool has_whole_texts(const RsyncJob &job);
 
 // Whether the store had to cut the field of that key.
 bool was_cut(const RsyncJob &job, std::string_view key);

@@ -4,11 +4,14 @@
 #include "common/text.h"
 #include "config/job_list.h"
 #include "config/schedule.h"
+#include "config/store_text.h"
 #include "platform/config_store.h"
 
 #include <algorithm>
 #include <cstdio>
 #include <cstring>
+#include <map>
+#include <utility>
 
 namespace bakjob
 {
@@ -17,6 +20,7 @@ namespace
 {
 
 constexpr const char *JOBS = "/backup_mgr/rsync";
+constexpr std::size_t LONGEST_TEXT = 1U << 20U;
 constexpr const char *JOB_COUNT = "/backup_mgr/rsync/count";
 
 // The path of one key of one item; reused from key to key, as there are tens of thousands of them.
@@ -37,6 +41,28 @@ private:
     char path_[128];
     std::size_t length_;
 };
+
+// Texts that did not fit their field, by job and key, from the load to the save: the job cannot use them, but
+// a save for another job's sake must not lose them.
+std::map<std::pair<std::string, std::string>, std::string> uncut_texts;
+
+std::string whole_text(const char *path)
+{
+    std::string text;
+    std::size_t size = 4096;
+    do {
+        size *= 4;
+        text = store_text(path, size);
+    } while (text.size() == size - 1 && size < LONGEST_TEXT);
+    return text;
+}
+
+const char *text_to_save(const RsyncJob &job, const JobField &field)
+{
+    const char *const text = text_field(job, field);
+    const auto uncut = uncut_texts.find({job.job_name, field.key});
+    return uncut != uncut_texts.end() && uncut->second.starts_with(text) ? uncut->second.c_str() : text;
+}
 
 // Whether the store has anything of the item.
 bool load_job(RsyncJob &job, int item)
@@ -65,6 +91,14 @@ bool load_job(RsyncJob &job, int item)
     return found;
 }
 
+void keep_uncut_texts(const RsyncJob &job, int item)
+{
+    ItemPath path(item);
+    for (const JobField &field : job_fields()) {
+        if (was_cut(job, field.key)) uncut_texts[{job.job_name, field.key}] = whole_text(path.key(field.key));
+    }
+}
+
 void save_job(const RsyncJob &job, int item)
 {
     ItemPath path(item);
@@ -73,7 +107,7 @@ void save_job(const RsyncJob &job, int item)
         if (field.size == 0) {
             xml_set_int(key, integer_field(job, field));
         } else {
-            xml_set_str(key, text_field(job, field));
+            xml_set_str(key, text_to_save(job, field));
         }
     }
 }
@@ -83,11 +117,13 @@ void save_job(const RsyncJob &job, int item)
 void rsync_load_jobs()
 {
     rsync_free_jobs();
+    uncut_texts.clear();
     const int count = xml_get_int(JOB_COUNT);
     for (int item = 1; item <= count; ++item) {
         RsyncJob job{};
         const bool found = load_job(job, item);
         const bool added = rsync_list_add_job(job) == 1;
+        if (added && job.cut_fields != 0) keep_uncut_texts(job, item);
         // Behind an item that is not there is none, whatever the count says.
         if (!found && !added) break;
     }

@@ -39,6 +39,8 @@ std::optional<std::string> section_name(std::string_view line)
 {
     constexpr std::size_t NAME_STARTS = 2;
     if (!contains(line, "[") || contains(line, PATH_KEY)) return std::nullopt;
+    // Behind what was kept of a line may stand the last bracket.
+    if (line.size() == LINE_LENGTH) return std::string(line.substr(NAME_STARTS));
     const std::size_t bracket = line.rfind(']');
     if (bracket == std::string_view::npos || bracket < NAME_STARTS + 1) return std::nullopt;
     return std::string(line.substr(NAME_STARTS, bracket - 1 - NAME_STARTS));

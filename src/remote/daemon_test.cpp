@@ -19,6 +19,7 @@ constexpr const char *RSYNC = "/usr/sbin/rsync ";
 
 std::optional<std::string> module_list_command(const RsyncJob &job)
 {
+    if (!has_whole_texts(job)) return std::nullopt;
     if (job.remote_ip[0] == '\0' || !is_safe_host(job.remote_ip)) return std::nullopt;
     return format_text("%s -8%s %s:: 2>&1", RSYNC, ipv6_flag(job.remote_ip),
                        bracketed_host(job.remote_ip).c_str());

@@ -4,6 +4,7 @@
 #include "common/job_files.h"
 #include "common/shell.h"
 #include "common/text.h"
+#include "config/config_lock.h"
 #include "config/current_job.h"
 #include "config/remote_modules.h"
 #include "remote/daemon_config.h"
@@ -20,33 +21,12 @@ namespace
 {
 
 constexpr int MOST_MODULES = 1024;
+constexpr int MOST_LINES = 4 * MOST_MODULES; // of a listing, which may never end
 
 void clear_list()
 {
     rsync_free_modules();
     *module_list = {};
-}
-
-void add_configured_modules(const std::string &local_copy)
-{
-    std::string name;
-    std::string path;
-    const auto add_if_whole = [&] {
-        if (name.empty() || path.empty()) return;
-        add_found_module(name, path);
-        name.clear();
-        path.clear();
-    };
-    read_daemon_config(local_copy, [&](const std::string &line) {
-        add_if_whole();
-        if (const auto folder = path_of_line(line)) {
-            path = *folder;
-        } else if (const auto section = section_name(line)) {
-            name = *section;
-        }
-        return true;
-    });
-    add_if_whole();
 }
 
 void measure_remote_side()
@@ -68,7 +48,11 @@ void measure_this_device()
             rsync_local_free_space(VOLUME_NAMES[i], module_list->local_free[i]);
         }
     }
-    std::string folders = CurrentJob.local_path; // is cut
+    if (was_cut(CurrentJob, "local_path")) {
+        copy_text(module_list->local_size, "N/A");
+        return;
+    }
+    std::string folders = CurrentJob.local_path; // is split in place
     rsync_local_du(folders.data(), module_list->local_size);
 }
 
@@ -79,11 +63,64 @@ void add_found_module(const std::string &name, const std::string &path)
     RemoteModule module{};
     if (!copy_text(module.name, name) || !copy_text(module.path, path)) {
         DebugLog("ERROR: remote module skipped: name or path too long\n");
-    } else if (module_list->count < MOST_MODULES) {
+    } else if (module_list->count == MOST_MODULES) {
+        DebugLog("ERROR: remote module skipped: more than %d\n", MOST_MODULES);
+    } else {
         copy_text(module.du_size, "0");
         rsync_add_module(module);
     }
 }
+
+bool add_configured_modules(const std::string &local_copy)
+{
+    std::string name;
+    std::string path;
+    const auto add_if_whole = [&] {
+        if (name.empty() || path.empty()) return;
+        add_found_module(name, path);
+        name.clear();
+        path.clear();
+    };
+    const bool read = read_daemon_config(local_copy, [&](const std::string &line) {
+        add_if_whole();
+        if (const auto folder = path_of_line(line)) {
+            path = *folder;
+        } else if (const auto section = section_name(line)) {
+            name = *section;
+        }
+        return true;
+    });
+    add_if_whole();
+    return read;
+}
+
+std::string module_of_listing_line(std::string line)
+{
+    trim_right(line);
+    const std::size_t tab = line.find('\t');
+    if (tab != std::string::npos) {
+        line.resize(tab);
+        line.resize(line.find_last_not_of(' ') + 1);
+    }
+    return line;
+}
+
+namespace
+{
+
+// Whether the configuration could be had.
+bool find_configured_modules()
+{
+    // The copy has one name for all: another discovery must not take it away, nor be given ours.
+    const UniqueFd lock = rsync_lock_config(DISCOVERY_LOCK_FILE);
+    if (!fetch_daemon_config(DISCOVERY_CONFIG_COPY)) return false;
+    const bool read = add_configured_modules(DISCOVERY_CONFIG_COPY);
+    unlink(DISCOVERY_CONFIG_COPY);
+    sync();
+    return read;
+}
+
+} // namespace
 
 void rsync_discover_remote()
 {
@@ -96,10 +133,7 @@ void rsync_discover_remote()
         rsync_remote_du(CurrentJob.remote_path, module_list->remote_size);
         return;
     }
-    if (!fetch_daemon_config(DISCOVERY_CONFIG_COPY)) return;
-    add_configured_modules(DISCOVERY_CONFIG_COPY);
-    unlink(DISCOVERY_CONFIG_COPY);
-    sync();
+    if (!find_configured_modules()) return;
     measure_remote_side();
     measure_this_device();
 }
@@ -112,11 +146,9 @@ int rsync_list_daemon_modules()
     if (!command) return 0;
     ShellReader reply(*command);
     if (!reply.started()) return 0;
-    for (std::string line; reply.read_line(line);) {
-        trim_right(line);
-        const std::size_t tab = line.find('\t');
-        if (tab != std::string::npos) line.resize(line.find_last_not_of(' ', tab - 1) + 1);
-        add_found_module(line, "");
+    std::string line;
+    for (int lines = 0; lines < MOST_LINES && reply.read_line(line); ++lines) {
+        add_found_module(module_of_listing_line(line), "");
     }
     return reply.close();
 }

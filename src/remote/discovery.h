@@ -15,8 +15,8 @@ namespace bakjob
 // more.
 void rsync_discover_remote();
 
-// Fills the list with the daemon's own listing, line by line, and the sizes of this device. The exit code of
-// the listing command; 0 when it could not be started or its host is refused.
+// Fills the list with the daemon's own listing, line by line, and the sizes of this device. The wait status
+// of the listing command; 0 when it could not be started or its host is refused.
 int rsync_list_daemon_modules();
 
 // Whether the remote daemon's secrets hold the job's daemon password, in base64, for the user root: REPLY_OK,
@@ -26,5 +26,13 @@ RemoteReplyCode rsync_check_remote_secret();
 // Adds a module of that name and path. One that does not fit its record is skipped, and so is what comes
 // beyond 1024 modules.
 void add_found_module(const std::string &name, const std::string &path);
+
+// Adds the modules that a local copy of the remote daemon's configuration names with a path. False when it
+// cannot be opened.
+bool add_configured_modules(const std::string &local_copy);
+
+// The module's name in a line of a daemon's listing: what stands in front of the first tab, without the
+// blanks that pad it.
+std::string module_of_listing_line(std::string line);
 
 } // namespace bakjob

@@ -8,7 +8,7 @@ namespace bakjob
 {
 
 // Looks up the module's folder in the remote daemon's configuration and makes "first/second" below it, open
-// to every user. `job_name` names the local copy of the configuration. The exit code of the remote command;
+// to every user. `job_name` names the local copy of the configuration. The wait status of the remote command;
 // -1 when the module's folder was not found or a value is refused.
 int rsync_prepare_remote_dir(const std::string &job_name, const std::string &module, const std::string &first,
                              const std::string &second);

@@ -41,11 +41,11 @@ bool is_du_size(std::string_view text)
     return begins_with_digit && (text.size() == 1 || contains("kKMG", text.substr(text.size() - 1)));
 }
 
-// Runs a remote command that was composed, or stands for an empty reply when it was refused. Nothing when it
-// could not be started.
+// The first line that a remote command prints; of a refused one, the empty line. Nothing when it could not be
+// started.
 std::optional<std::string> reply_of(const std::optional<std::string> &command)
 {
-    return command ? first_reply_line(*command) : std::string();
+    return command ? first_line(*command) : std::string();
 }
 
 // How du is called where logins have no name, by address kind, with du's own folder known to be there or not:
@@ -111,7 +111,7 @@ void rsync_local_free_space(const std::string &volume, SizeText &free)
     copy_text(free, UNKNOWN);
     const auto word = shell_path("volume", volume);
     if (!word) return;
-    const auto line = first_reply_line(format_text("df -h | grep %s 2>&1", word->c_str()));
+    const auto line = first_line(format_text("df -h | grep %s 2>&1", word->c_str()));
     if (line) size_of_df_line(*line, free);
 }
 
@@ -155,6 +155,7 @@ void rsync_remote_du(const std::string &folder, SizeText &size)
     const auto escaped = shell_path("remote folder", folder);
     const auto command = escaped ? du_command(CurrentJob, *escaped) : std::nullopt;
     DebugLog("--->[%s]\n", command.value_or("").c_str());
+    if (!command && ssh_login_of(CurrentJob)) copy_text(size, UNKNOWN); // refused
     const auto line = reply_of(command);
     if (line) size_of_du_reply(*line, size);
 }

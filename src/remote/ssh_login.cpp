@@ -34,6 +34,7 @@ std::optional<std::string> ssh_password(const RsyncJob &job)
 std::optional<std::string> ssh_command(const RsyncJob &job, SshLogin login, std::string_view remote_command)
 {
     const auto password = ssh_password(job);
+    if (!has_whole_texts(job)) return std::nullopt;
     if (!password || job.remote_ip[0] == '\0' || !is_safe_host(job.remote_ip)) return std::nullopt;
     const std::string option = password->empty() ? "" : format_text("-d '%s'", password->c_str());
     const std::string six = *ipv6_flag(job.remote_ip) == '\0' ? "" : "-6 ";

@@ -27,8 +27,8 @@ std::optional<std::string> ssh_command(const RsyncJob &job, SshLogin login, std:
 // The job's ssh password as base64 text, empty for none; nothing when it has no such form.
 std::optional<std::string> ssh_password(const RsyncJob &job);
 
-// Runs a command line on the remote host of CurrentJob and waits: the exit code of the ssh client, -1 when a
-// value is refused. `command` is one word for the local shell: the caller quotes it.
+// Runs a command line on the remote host of CurrentJob and waits: the wait status of the ssh client, -1 when
+// a value is refused. `command` is one word for the local shell: the caller quotes it.
 int rsync_remote_exec(std::string_view command);
 
 } // namespace bakjob

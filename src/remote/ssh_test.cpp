@@ -8,7 +8,6 @@
 #include "remote/ssh_login.h"
 
 #include <array>
-#include <optional>
 #include <string>
 #include <unistd.h>
 
@@ -29,14 +28,6 @@ constexpr std::array FRAGMENTS = {
     Fragment{"Connection timed out", SSH_TIMED_OUT},
 };
 
-std::optional<SshTestResult> judge(const std::string &line)
-{
-    for (const Fragment &fragment : FRAGMENTS) {
-        if (contains(line, fragment.text)) return fragment.result;
-    }
-    return line.empty() ? SSH_FAILED : SSH_OK;
-}
-
 void forget_host_key(const std::string &remote_ip)
 {
     DebugLog("--->##### SERVER SSH key changed!\n");
@@ -46,6 +37,14 @@ void forget_host_key(const std::string &remote_ip)
 }
 
 } // namespace
+
+std::optional<SshTestResult> judge_ssh_reply(std::string_view line)
+{
+    for (const Fragment &fragment : FRAGMENTS) {
+        if (contains(line, fragment.text)) return fragment.result;
+    }
+    return line.empty() ? SSH_FAILED : SSH_OK;
+}
 
 SshTestResult ssh_test()
 {
@@ -58,12 +57,12 @@ SshTestResult ssh_test()
     auto reply = first_reply_line(*command);
     if (!reply) return SSH_FAILED;
     DebugLog("--->[%s]\n", reply->c_str());
-    auto result = judge(*reply);
+    auto result = judge_ssh_reply(*reply);
     if (result) return *result;
 
     forget_host_key(CurrentJob.remote_ip);
     reply = first_reply_line(*command);
-    result = reply ? judge(*reply) : SSH_FAILED;
+    result = reply ? judge_ssh_reply(*reply) : SSH_FAILED;
     return result.value_or(SSH_FAILED);
 }
 

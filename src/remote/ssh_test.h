@@ -5,6 +5,8 @@
 #include "config/job.h"
 
 #include <cstdint>
+#include <optional>
+#include <string_view>
 
 namespace bakjob
 {
@@ -21,5 +23,8 @@ enum SshTestResult : std::int32_t {
 // Tests the login of CurrentJob. When the host's key has changed, the stored key is removed and the login is
 // tried once more.
 SshTestResult ssh_test();
+
+// What the first line of a login's reply means; nothing: the host's key has changed.
+std::optional<SshTestResult> judge_ssh_reply(std::string_view line);
 
 } // namespace bakjob

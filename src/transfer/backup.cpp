@@ -96,9 +96,9 @@ int transfer_with_retries(const std::string &job_name, const RsyncJob &job, cons
     DebugLog("rsync_cmd = [%s]\n", dry_run.c_str());
     int attempts_left = job.retry;
     for (;;) {
-        int code = run_shell(dry_run);
+        int code = exit_code(run_shell(dry_run));
         if (code == 0 || code == RSYNC_PARTIAL) {
-            code = run_shell(with_dump_size(command));
+            code = exit_code(run_shell(with_dump_size(command)));
         } else {
             unlink(transfer_size_file(job_name).c_str());
         }
@@ -146,10 +146,7 @@ BackupResult rsync_run_backup(const std::string &job_name, RsyncJob &job)
         DebugLog("ERROR: server_type refused: %d\n", job.server_type);
         return BACKUP_FAILED;
     }
-    if (const char *const field = cut_command_field(job)) {
-        DebugLog("ERROR: %s refused: too long\n", field);
-        return BACKUP_FAILED;
-    }
+    if (!has_whole_texts(job)) return BACKUP_FAILED;
     if (job.use_ssh == 1 && ssh_test() != SSH_OK) return BACKUP_SSH_FAILED;
     // Without its password file a daemon transfer could only fail, or worse, take somebody else's.
     if (!rsync_write_password_file() && job.rsync_mode == RSYNC_MODE_DAEMON) return BACKUP_FAILED;
