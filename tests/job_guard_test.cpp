@@ -148,25 +148,6 @@ TEST_F(State, OnlyStaleStatesAreReset)
     EXPECT_FALSE(exists("/var/lib/device_flash/config.xml"));
 }
 
-TEST_F(State, ChangesOfManyProcessesAllArrive)
-{
-    constexpr int PROCESSES = 8;
-    constexpr int CHANGES = 10;
-    for (int i = 1; i <= PROCESSES; ++i)
-        add_job({{"job_name", "j" + std::to_string(i)}, {"state", "0"}});
-    for (int i = 1; i <= PROCESSES; ++i) {
-        if (fork() != 0) continue;
-        for (int n = 1; n <= CHANGES; ++n)
-            rsync_set_job_state("j" + std::to_string(i), static_cast<JobState>(100 * i + n));
-        _exit(0);
-    }
-    while (wait(nullptr) > 0) {
-    }
-    for (int i = 1; i <= PROCESSES; ++i)
-        EXPECT_EQ(job_key(i, "state"), std::to_string(100 * i + CHANGES));
-    EXPECT_EQ(std::distance(fs::directory_iterator("/etc/NAS_CFG"), fs::directory_iterator()), 1);
-}
-
 TEST_F(State, TheLockIsExclusiveAndNobodyElsesFile)
 {
     const char *const path = "/tmp/lock";

@@ -267,8 +267,7 @@ TEST_F(Sizes, RemoteCommandsAreExact)
         {1, false, "fe80::1", "-d 'c3No' -6 fe80::1%egiga0 du -sh  /m 2>&1"},
         {1, false, "::1", "-d 'c3No' -6 ::1 du -sh /m  2>&1"},
         {2, true, "10.0.0.1", "-d 'c3No' me@10.0.0.1 du -sh /m 2>&1"},
-        {2, true, "fe80::1", "-6 -d 'c3No' me@fe80::1%egiga0 du -sh /m 2>&1"},
-    };
+        {2, true, "fe80::1", "-6 -d 'c3No' me@fe80::1%egiga0 du -sh /m 2>&1"}};
     write_file("/tmp/reply", "5M\t/m\n");
     run_options.debug_mode = 1;
     for (const Case &one : cases) {
@@ -360,9 +359,10 @@ TEST_F(Sizes, ModulesAreReadFromTheRemoteConfiguration)
         {"path = /0\n[ a ]\n[ b ]\npath = /b\n", "a=/0 b=/b "},
         {"[ a ]\npath = /x[1]\n", "a=/x[1] "},
         {"[ " + long_name + " ]\npath = " + long_path + "\n", long_name + "=" + long_path + " "},
+        {"[ a ]\npath = /a" + std::string(4090, ' ') + "more\n[ b ]\npath = /b\n", "b=/b "},
+        {"[ a ]" + std::string(5000, 'x') + " ]\npath = /a\n[ b ]\npath = /b\n", "b=/b "},
         {"[ " + long_name + "x ]\npath = /x\n[ b ]\npath = " + long_path + "p\n[ c ]\npath = /c\n", "c=/c "},
-        {"", ""},
-    };
+        {"", ""}};
     CurrentJob.server_type = 1;
     CurrentJob.backup_type = 1;
     for (const Case &one : cases) {

@@ -76,15 +76,17 @@ TEST_F(RemoteSide, PushAndPullOverEveryAddressAndTransport)
 
 TEST_F(RemoteSide, SnapshotsKeepWhatOlderRunsFetched)
 {
-    add_job({{"backup_type", "2"}, {"inc_enable", "1"}, {"inc_number", "3"}});
-    const std::string remote = "/remote/backup/S1_remote_backup/daily/Public/";
-    const std::string base = std::string(SHARE) + "/daily.";
+    const std::string name = "it's 100% $x #1";
+    const std::string quoted = "\"it's 100% \\$x #1\"";
+    add_job({{"job_name", name}, {"backup_type", "2"}, {"inc_enable", "1"}, {"inc_number", "3"}});
+    const std::string remote = "/remote/backup/S1_remote_backup/" + name + "/Public/";
+    const std::string base = std::string(SHARE) + "/" + name + ".";
     write_file(remote + "same", "same");
     for (const char *content : {"one", "two", "three", "four"}) {
         write_file(remote + "file", content);
         fs::last_write_time(remote + "file",
                             fs::file_time_type::clock::now() + std::chrono::seconds(content[1]));
-        run("-r daily");
+        run("-r " + quoted);
         expect_state(1, "2");
     }
     EXPECT_EQ(read_file(base + "0/file") + read_file(base + "1/file") + read_file(base + "2/file"),
@@ -92,8 +94,8 @@ TEST_F(RemoteSide, SnapshotsKeepWhatOlderRunsFetched)
     EXPECT_FALSE(exists(base + "3"));
     EXPECT_TRUE(fs::equivalent(base + "0/same", base + "2/same"));
 
-    fs::remove_all("/remote/backup/S1_remote_backup/daily/Public/file");
-    run("-n 3 -r daily");
+    fs::remove_all(remote + "file");
+    run("-n 3 -r " + quoted);
     expect_state(1, "2");
     EXPECT_EQ(read_file(remote + "file"), "two") << "snapshot 3 of the listing is number 2";
     EXPECT_NE(trace_.find("scan file num [3]\n"), std::string::npos);
@@ -130,8 +132,7 @@ TEST_F(RemoteSide, FailuresAreAlertsAndFailedJobs)
         {{{"remote_ip", "nosuch.invalid"}}, "--->["},
         {{{"backup_type", "2"}, {"remote_path", "data/missing"}}, "No such file or directory (2)]"},
         {wrong_login, "--->[root@127.0.0.1: Permission denied (publickey,password).]"},
-        {no_login, "--->[root@127.0.0.1: Permission denied (publickey,password).]"},
-    };
+        {no_login, "--->[root@127.0.0.1: Permission denied (publickey,password).]"}};
     for (const Case &one : cases) {
         SetUp();
         add_job(one.keys);

@@ -2,6 +2,7 @@
 #include "config/job_store.h"
 #include "config/schedule.h"
 #include "platform/config_store.h"
+#include "platform/scheduler.h"
 #include "support.h"
 
 using namespace bakjob;
@@ -70,8 +71,7 @@ TEST_F(Schedule, PruningKeepsExactlyTheEntriesThatNameAJob)
          {std::string(255, 'x'), std::string(300, 'x') + "'a'", "-r 'b'"},
          std::string(300, 'x') + "'a'|",
          all_groups,
-         true},
-    };
+         true}};
     for (const Case &one : cases) {
         SetUp();
         set_entries(one.commands);
@@ -112,6 +112,12 @@ TEST_F(Schedule, AnEntryIsCreatedForTheSchedulerAndTheGroupDeleted)
     EXPECT_EQ(entries(), "/usr/sbin/bakjob -r '100%'|/usr/sbin/bakjob -r 'b'|");
     EXPECT_NE(read_file("/etc/cron.d/device_scheduler").find("5 2 * * 1 root /usr/sbin/bakjob -r '100\\%'\n"),
               std::string::npos);
+    for (const char *list : {"/system_mgr/crond/rsync/count", "/system_mgr/crond/list/count"})
+        store_set(list, "2147483647");
+    EXPECT_EQ(LIB_do_ctc(), 0) << "ends with the entries that are there, whatever the count says";
+    EXPECT_EQ(lines_of(read_file("/etc/cron.d/device_scheduler")).size(), 2U);
+    EXPECT_LT(LIB_create_xml("7", "2", "*", "*", "1", "root", "x", "rsync"), 0);
+    store_set("/system_mgr/crond/list/count", "1");
     rsync_delete_schedule();
     EXPECT_EQ(entries(), "");
     EXPECT_EQ(read_file("/etc/cron.d/device_scheduler").find("bakjob -r"), std::string::npos);

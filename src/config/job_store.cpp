@@ -20,8 +20,8 @@ namespace
 {
 
 constexpr const char *JOBS = "/backup_mgr/rsync";
-constexpr std::size_t LONGEST_TEXT = 1U << 20U;
 constexpr const char *JOB_COUNT = "/backup_mgr/rsync/count";
+constexpr std::size_t LONGEST_TEXT = 1U << 20U; // bytes that a save brings back
 
 // The path of one key of one item; reused from key to key, as there are tens of thousands of them.
 class ItemPath
@@ -60,6 +60,7 @@ std::string whole_text(const char *path)
 const char *text_to_save(const RsyncJob &job, const JobField &field)
 {
     const char *const text = text_field(job, field);
+    if (std::strlen(text) < field.size - 1) return text;
     const auto uncut = uncut_texts.find({job.job_name, field.key});
     return uncut != uncut_texts.end() && uncut->second.starts_with(text) ? uncut->second.c_str() : text;
 }
