@@ -3,6 +3,7 @@
 #include "atomic_file.h"
 #include "platform/config_store.h"
 #include "store.h"
+#include "store_path.h"
 #include "store_paths.h"
 
 #include <algorithm>
@@ -55,7 +56,7 @@ std::string listed_name(int number)
 
 int count_of(const std::string &list)
 {
-    return std::max(xml_get_int((list + "/count").c_str()), 0);
+    return std::clamp(xml_get_int((list + "/count").c_str()), 0, StorePath::HIGHEST_INDEX);
 }
 
 bool set(const std::string &path, const char *text)
@@ -73,7 +74,8 @@ int place_of(const char *group)
 {
     const int count = count_of(GROUP_LIST);
     for (int i = 1; i <= count; ++i) {
-        if (store_text(listed_name(i)) == group) return i;
+        const auto name = store_text(listed_name(i));
+        if (!name || *name == group) return name ? i : 0;
     }
     return 0;
 }
@@ -120,7 +122,8 @@ std::string cron_lines(const std::string &group)
     std::string lines;
     const std::string path = group_path(group);
     const int count = count_of(path);
-    for (int number = 1; number <= count; ++number) {
+    // Behind an entry that is not there is none, whatever the count says.
+    for (int number = 1; number <= count && store_text(item_path(path, number)); ++number) {
         Entry entry;
         for (std::size_t i = 0; i < KEYS.size(); ++i) {
             entry[i] = store_text(item_path(path, number) + "/" + KEYS[i]).value_or("");
@@ -173,7 +176,9 @@ int LIB_do_ctc(void)
     std::string lines;
     const int count = count_of(GROUP_LIST);
     for (int i = 1; i <= count; ++i) {
-        lines += cron_lines(store_text(listed_name(i)).value_or(""));
+        const auto group = store_text(listed_name(i));
+        if (!group) break;
+        lines += cron_lines(*group);
     }
     if (replace_file(CRON_FILE, lines, 0644)) return 0;
     std::fprintf(stderr, "scheduler: cannot write %s: %s\n", CRON_FILE, std::strerror(errno));
