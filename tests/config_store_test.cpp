@@ -228,8 +228,8 @@ TEST_F(FullDisk, AFailedWriteKeepsTheOldFileAndDropsTheChanges)
     EXPECT_EQ(xml_write_file(STORE), 0);
     EXPECT_EQ(text_at("/a"), "1");
 
-    ASSERT_EQ(mount("/etc/NAS_CFG", "/etc/NAS_CFG", nullptr, MS_BIND, nullptr), 0);
-    ASSERT_EQ(mount(nullptr, "/etc/NAS_CFG", nullptr, MS_REMOUNT | MS_BIND | MS_RDONLY, nullptr), 0);
+    ASSERT_EQ(mount("/etc/NAS_CFG", "/etc/NAS_CFG", "", MS_BIND, nullptr), 0);
+    ASSERT_EQ(mount(nullptr, "/etc/NAS_CFG", "", MS_REMOUNT | MS_BIND | MS_RDONLY, nullptr), 0);
     ASSERT_EQ(xml_set_str("/b", "3"), 0);
     EXPECT_LT(xml_write_file(STORE), 0);
     EXPECT_EQ(text_at("/b"), "2");

@@ -180,6 +180,7 @@ const std::vector<KindOfRun> KINDS = {{"push", {}, {}},
 // Whether a failed run says why: by a refusal, or by the command that it tried last.
 bool is_explained(const std::string &trace, const std::string &field, const std::string &value)
 {
+    if (field == "remote_ip" && value.empty()) return true; // nothing to say about no host
     const bool hostile = value.find_first_of("\"\\|<>*?\t\n\r") != std::string::npos;
     if (hostile && (field == "remote_ip" || field == "remote_path")) {
         return trace.find("ERROR: " + field + " refused") != std::string::npos;
