@@ -367,18 +367,21 @@ TEST_F(Sizes, ModulesAreReadFromTheRemoteConfiguration)
     CurrentJob.backup_type = 1;
     for (const Case &one : cases) {
         write_file("/tmp/config", one.config);
-        write_file("/tmp/reply", "x 1 2 3G HD_d2\n");
-        rsync_discover_remote();
+        rsync_free_modules();
+        EXPECT_TRUE(add_configured_modules("/tmp/config"));
         std::string modules;
         for (const RemoteModule *module = module_list->head; module != nullptr; module = module->next) {
             modules += module->name + std::string("=") + module->path + " ";
             EXPECT_STREQ(module->du_size, "0");
         }
         EXPECT_EQ(modules, one.modules);
-        EXPECT_STREQ(module_list->remote_free[3], "3G");
-        EXPECT_STREQ(module_list->local_free[0], "");
-        EXPECT_FALSE(exists("/tmp/remote_rinfo.txt"));
     }
+    EXPECT_FALSE(add_configured_modules("/tmp/none"));
+    write_file("/tmp/reply", "x 1 2 3G HD_d2\n");
+    rsync_discover_remote();
+    EXPECT_STREQ(module_list->remote_free[3], "3G");
+    EXPECT_STREQ(module_list->local_free[0], "");
+    EXPECT_FALSE(exists("/tmp/remote_rinfo.txt"));
     CurrentJob.backup_type = 2;
     write_file("/tmp/config", "[ a ]\npath = /a\n[ b ]\npath = /b;reboot\n");
     write_file("/tmp/reply", "5M\t/a\n");

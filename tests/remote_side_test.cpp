@@ -63,6 +63,7 @@ TEST_F(RemoteSide, PushAndPullOverEveryAddressAndTransport)
                 const std::string local = SHARE + std::string("/My Photos (1)/it's $x #1/f");
                 const std::string remote = (by_ssh ? "/remote/data/ssh" : "/remote/backup") + below;
                 if (by_ssh) fs::create_directories("/remote/data/ssh/S1_remote_backup/daily/Public");
+                if (ip == "::1") fs::create_directories("/remote/backup/S1_remote_backup/daily/Public");
                 write_file(direction == "1" ? local : remote, "content");
                 fs::create_directories(fs::path(local).parent_path().parent_path());
                 run("-r daily");
