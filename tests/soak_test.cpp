@@ -14,6 +14,7 @@
 
 #include <algorithm>
 #include <arpa/inet.h>
+#include <chrono>
 #include <csignal>
 #include <cstring>
 #include <fcntl.h>
@@ -275,12 +276,19 @@ TEST_F(Holds, AKillInMidSaveLeavesTheOldTreeOrTheNew)
     std::mt19937 random(1);
     int failures = 0;
     int saved = 0;
+    store_set("/backup_mgr/rsync/item:1/state", "3");
+    store_save();
+    const auto begin = std::chrono::steady_clock::now();
+    wait_for(start({"-a"}));
+    const auto whole =
+        std::chrono::duration_cast<std::chrono::microseconds>(std::chrono::steady_clock::now() - begin);
+    std::uniform_int_distribution<useconds_t> moment(0, static_cast<useconds_t>(2 * whole.count()));
     for (int i = 0; i < tries; ++i) {
         const std::string state = "/backup_mgr/rsync/item:" + std::to_string(i % 40 + 1) + "/state";
         store_set(state, "3");
         store_save();
         const pid_t child = start({"-a"});
-        usleep(std::uniform_int_distribution<useconds_t>(0, 20'000)(random));
+        usleep(moment(random));
         kill(child, SIGKILL);
         wait_for(child);
         // A process of its own: what it reads is what the file holds.
@@ -336,27 +344,30 @@ TEST_F(Holds, OfManyWritersNothingIsLostAndNoReadIsTorn)
 
 TEST_F(Holds, OfManyRunsOfAJobOneStarts)
 {
-    const Fake rsync(
-        "/usr/sbin/rsync",
-        "case \"$*\" in *--dry-run*|*::) ;; *) cat /var/run/bakjob_daily.pid >>/tmp/pids; sleep 1 ;; esac\n");
+    // The one that runs goes on until the others have ended.
+    const Fake rsync("/usr/sbin/rsync", "case \"$*\" in *--dry-run*|*::) ;; *) cat /var/run/bakjob_daily.pid "
+                                        ">>/tmp/pids; until [ -e /tmp/go ]; do sleep 0.05; done ;; esac\n");
+    constexpr int RUNS = 64;
     const int tries = rounds(2, 20);
     int failures = 0;
     add_job({});
     for (int round = 0; round < tries; ++round) {
-        unlink("/tmp/pids");
-        std::vector<pid_t> runs;
-        for (int i = 0; i < 64; ++i)
-            runs.push_back(start({"-r", "daily"}));
+        shell("rm -f /tmp/pids /tmp/go");
+        for (int i = 0; i < RUNS; ++i)
+            start({"-r", "daily"});
         int refused = 0;
-        pid_t ran = 0;
-        for (const pid_t run : runs) {
-            if (wait_for(run) == 255) {
-                ++refused;
-            } else {
-                ran = run;
-            }
-        }
-        const bool one = refused == 63 && read_file("/tmp/pids") == std::to_string(ran) + "\n" &&
+        int status = 0;
+        eventually(
+            [&] {
+                while (waitpid(-1, &status, WNOHANG) > 0)
+                    refused += WEXITSTATUS(status) == 255 ? 1 : 0;
+                return refused == RUNS - 1;
+            },
+            60);
+        write_file("/tmp/go", "");
+        const pid_t ran = wait(&status);
+        const bool one = refused == RUNS - 1 && status == 0 && wait(nullptr) < 0 &&
+                         read_file("/tmp/pids") == std::to_string(ran) + "\n" &&
                          !exists("/var/run/bakjob_daily.pid");
         failures += one ? 0 : 1;
     }
