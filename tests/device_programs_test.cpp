@@ -102,6 +102,31 @@ TEST_F(Programs, ATransferShowsItsJobInEveryProcess)
     EXPECT_TRUE(eventually([&] { return count_lines(shell("ps").output, parts) == 0; }));
 }
 
+TEST_F(Programs, ATransferPublishesItsFigures)
+{
+    for (int i = 0; i < 30; ++i) {
+        write_file("/mnt/HD/x/" + std::to_string(i), std::string(1000, 'x'));
+    }
+    write_file("/tmp/other", "untouched");
+    shell("ln -s /tmp/other '/tmp/r_it'\\''s 1'; ln -s /tmp/other '/tmp/r_it'\\''s 1.dump_size'");
+    const std::string rsync = "/usr/sbin/rsync --job-name=it\\'s\\ 1 -aHq8 --dump-size ";
+    const std::string ends = "/mnt/HD/x/ 127.0.0.1::data 2>/dev/null";
+    const std::string all = "                  30                30000\n";
+    EXPECT_EQ(shell(rsync + "--dry-run " + ends).output, "");
+    EXPECT_EQ(read_file("/tmp/r_it's 1.dump_size"), all);
+    EXPECT_FALSE(exists("/remote/data/29"));
+    EXPECT_EQ(shell(rsync + ends).output, "");
+    EXPECT_EQ(read_file("/tmp/r_it's 1"), all);
+    EXPECT_EQ(shell(rsync + "--dry-run " + ends).status, 0);
+    EXPECT_EQ(read_file("/tmp/r_it's 1.dump_size"), "                   0                    0\n");
+    EXPECT_EQ(read_file("/tmp/other"), "untouched");
+
+    // However a transfer ends, its caller hears of it.
+    EXPECT_EQ(shell(rsync + "/mnt/HD/none " + ends).status, 23);
+    EXPECT_EQ(shell(rsync + "/mnt/HD/x/ 127.0.0.1::none 2>/dev/null").status, 5);
+    EXPECT_EQ(shell("/usr/sbin/rsync --job-name=a/b --dump-size -aq8 " + ends).status, 0);
+}
+
 TEST_F(Programs, RsyncReachesEveryKindOfPlaceAndAsksNothing)
 {
     write_file("/remote/data/file", "x");

@@ -1,9 +1,12 @@
 // rsync: the stock program, with what the appliance's own adds to it.
 //
 //   --job-name=NAME   the job that a transfer belongs to; it stays visible in the process list
-//   --dump-size       taken and ignored
+//   --dump-size       publish how far the job's transfer is (transfer_figures.h)
 //
 // It never asks a question, and gives up on a far end that stays silent.
+
+#include "stock_rsync.h"
+#include "transfer_figures.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -18,14 +21,16 @@
 namespace
 {
 
+using Arguments = std::vector<std::string>;
+
 constexpr const char *STOCK_RSYNC = "/usr/bin/rsync";
 constexpr const char *OWN_NAME = "/usr/sbin/rsync";
 constexpr const char *REMOTE_SHELL = "/usr/sbin/ssh";
 constexpr std::string_view JOB_NAME = "--job-name=";
 
 // So that a far end which takes a connection and then says nothing does not hold a job for ever.
-std::string connect_limit = "--contimeout=30";
-std::string silence_limit = "--timeout=60";
+constexpr const char *CONNECT_LIMIT = "--contimeout=30";
+constexpr const char *SILENCE_LIMIT = "--timeout=60";
 
 enum class Place { HERE, BEHIND_SHELL, DAEMON };
 
@@ -43,57 +48,77 @@ Place place_of(std::string_view argument)
     return argument.substr(colon).starts_with("::") ? Place::DAEMON : Place::BEHIND_SHELL;
 }
 
-bool has_option(const std::vector<char *> &arguments, std::string_view start)
+bool has_option(const Arguments &arguments, std::string_view start)
 {
     return std::any_of(arguments.begin(), arguments.end(),
-                       [&](const char *argument) { return std::string_view(argument).starts_with(start); });
+                       [&](const std::string &argument) { return argument.starts_with(start); });
 }
 
 // Stock rsync refuses a connect limit where it makes no connection of its own. How long a job's transfer may
 // be silent is the job's to say.
-void add_limits(std::vector<char *> &arguments, bool of_job)
+void add_limits(Arguments &arguments, bool of_job)
 {
     bool daemon = false;
     bool remote = false;
-    for (const char *argument : arguments) {
+    for (const std::string &argument : arguments) {
         const Place place = place_of(argument);
         daemon = daemon || place == Place::DAEMON;
         remote = remote || place != Place::HERE;
     }
     const bool own_shell = has_option(arguments, "-e") || has_option(arguments, "--rsh");
     if (remote && !of_job && !has_option(arguments, "--timeout"))
-        arguments.insert(arguments.begin(), silence_limit.data());
+        arguments.insert(arguments.begin(), SILENCE_LIMIT);
     if (daemon && !own_shell && !has_option(arguments, "--contimeout")) {
-        arguments.insert(arguments.begin(), connect_limit.data());
+        arguments.insert(arguments.begin(), CONNECT_LIMIT);
     }
 }
 
-int run_stock(std::vector<char *> &arguments)
+// Takes the option out of the arguments; the last one of those that begin so, empty when there is none.
+std::string take_option(Arguments &arguments, std::string_view start)
 {
-    arguments.push_back(nullptr);
-    execv(STOCK_RSYNC, arguments.data());
-    std::fprintf(stderr, "rsync: cannot run %s: %s\n", STOCK_RSYNC, std::strerror(errno));
-    return EXIT_FAILURE;
+    std::string taken;
+    std::erase_if(arguments, [&](const std::string &argument) {
+        const bool found = argument.starts_with(start);
+        if (found) taken = argument;
+        return found;
+    });
+    return taken;
+}
+
+// A name that could lead out of the folder of the figures has none.
+bool has_figures(const std::string &job_name)
+{
+    return !job_name.empty() && job_name.find('/') == std::string::npos;
 }
 
 } // namespace
 
+int exec_stock_rsync(const Arguments &arguments)
+{
+    std::vector<char *> pointers;
+    for (const std::string &argument : arguments) {
+        pointers.push_back(const_cast<char *>(argument.c_str()));
+    }
+    pointers.push_back(nullptr);
+    execv(STOCK_RSYNC, pointers.data());
+    std::fprintf(stderr, "rsync: cannot run %s: %s\n", STOCK_RSYNC, std::strerror(errno));
+    return EXIT_FAILURE;
+}
+
 int main(int argc, char **argv)
 {
-    std::vector<char *> arguments(argv + 1, argv + argc);
-    std::string name = OWN_NAME;
-    const bool serves = !arguments.empty() && std::strcmp(arguments.front(), "--server") == 0;
-    if (!serves) {
-        const auto is_own = [&](const char *argument) {
-            const std::string_view text = argument;
-            if (text.starts_with(JOB_NAME)) name = std::string(OWN_NAME) + ' ' + argument;
-            return text.starts_with(JOB_NAME) || text == "--dump-size";
-        };
-        arguments.erase(std::remove_if(arguments.begin(), arguments.end(), is_own), arguments.end());
-        add_limits(arguments, name != OWN_NAME);
-        setenv("RSYNC_RSH", REMOTE_SHELL, 1);
-        setenv("RSYNC_PASSWORD", "", 0);
+    Arguments arguments(argv + 1, argv + argc);
+    if (!arguments.empty() && arguments.front() == "--server") {
+        arguments.insert(arguments.begin(), OWN_NAME);
+        return exec_stock_rsync(arguments);
     }
-    arguments.insert(arguments.begin(), name.data());
-    return run_stock(arguments);
+    const std::string job = take_option(arguments, JOB_NAME);
+    const bool dump_size = !take_option(arguments, "--dump-size").empty();
+    add_limits(arguments, !job.empty());
+    setenv("RSYNC_RSH", REMOTE_SHELL, 1);
+    setenv("RSYNC_PASSWORD", "", 0);
+    arguments.insert(arguments.begin(), job.empty() ? OWN_NAME : OWN_NAME + (' ' + job));
+    const std::string job_name = job.substr(std::min(JOB_NAME.size(), job.size()));
+    if (dump_size && has_figures(job_name)) return run_with_figures(job_name, arguments);
+    return exec_stock_rsync(arguments);
 }
