@@ -10,6 +10,7 @@
 
 #include <cerrno>
 #include <charconv>
+#include <csignal>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -20,16 +21,18 @@ namespace bakjob
 namespace
 {
 
-// The file's text becomes the argument of a kill as root: it has to be one process id and nothing else.
-bool holds_process_id(const std::string &path)
+// The file's text becomes the argument of a kill as root: it has to be one process id and nothing else. 0
+// when it is not.
+pid_t process_id_in(const std::string &path)
 {
     const UniqueFd file = open_own_file(path, O_RDONLY);
     char text[32] = "";
-    if (!file || read(file.get(), text, sizeof text - 1) <= 0) return false;
+    if (!file || read(file.get(), text, sizeof text - 1) <= 0) return 0;
     const std::string_view content(text);
     pid_t pid = 0;
     const auto [end, error] = std::from_chars(content.data(), content.data() + content.size(), pid);
-    return error == std::errc() && pid > 0 && (*end == '\0' || std::string_view(end) == "\n");
+    const bool whole = error == std::errc() && (*end == '\0' || std::string_view(end) == "\n");
+    return whole && pid > 0 ? pid : 0;
 }
 
 } // namespace
@@ -52,6 +55,12 @@ bool rsync_write_pid_file(const std::string &job_name)
     return false;
 }
 
+pid_t rsync_running_process(const std::string &job_name)
+{
+    const pid_t pid = process_id_in(pid_file(job_name));
+    return pid > 0 && (kill(pid, 0) == 0 || errno == EPERM) ? pid : 0;
+}
+
 int rsync_remove_pid_file(const std::string &job_name)
 {
     return unlink(pid_file(job_name).c_str());
@@ -66,7 +75,7 @@ int rsync_kill_job_process(const std::string &job_name)
 {
     if (rsync_pid_file_absent(job_name)) return -1;
     const std::string path = pid_file(job_name);
-    if (!holds_process_id(path)) {
+    if (process_id_in(path) == 0) {
         DebugLog("ERROR: no process id in [%s]\n", path.c_str());
         return -1;
     }

@@ -4,6 +4,7 @@
 // each of its rsync processes. All operations take a job name that is_job_name accepts.
 
 #include <string>
+#include <sys/types.h>
 
 namespace bakjob
 {
@@ -15,6 +16,9 @@ bool rsync_pid_file_absent(const std::string &job_name);
 // Makes the pid file, with this process's id. False (errno) when it cannot be made; EEXIST: another run was
 // quicker.
 bool rsync_write_pid_file(const std::string &job_name);
+
+// The process that the job's pid file names, if one of that number lives; else 0.
+pid_t rsync_running_process(const std::string &job_name);
 
 // 0 when the file was there and is gone, else -1.
 int rsync_remove_pid_file(const std::string &job_name);

@@ -66,37 +66,12 @@ bool take_pid_file(const std::string &job_name)
     return false;
 }
 
-std::string remote_backup_root(const std::string &job_name)
-{
-    char serial[SERIAL_SIZE] = "";
-    rsync_read_serial(serial);
-    if (std::strpbrk(serial, "\r\n") != nullptr) {
-        DebugLog("ERROR: line break in the serial text of [%s]: no remote folder can be named\n",
-                 SERIAL_FILE);
-    }
-    return format_text("/%s_remote_backup/%s", serial, job_name.c_str());
-}
-
 void raise_alert(const RsyncJob &job, bool done)
 {
     rsync_alert_text(job);
     const int success = is_restore_run() ? ALERT_RESTORE_DONE : ALERT_FOLDER_DONE;
     const int failure = is_restore_run() ? ALERT_RESTORE_FAILED : ALERT_FOLDER_FAILED;
     fireAlert(ALERT_LEVEL, done ? success : failure, run_options.alert_text);
-}
-
-// Points the job at the resolved folder's two ends. False when the remote one does not fit.
-bool set_ends(RsyncJob &job, const std::string &folder)
-{
-    std::string remote_path = std::string(job.remote_path) + share_remote_dir;
-    if (is_restore_run()) {
-        copy_text(job.local_path, share_path);
-    } else {
-        remote_path += folder.substr(std::strlen(share_path));
-    }
-    if (copy_text(job.remote_path, remote_path)) return true;
-    DebugLog("ERROR: remote_path refused: too long\n");
-    return false;
 }
 
 struct FolderPlace {
@@ -112,7 +87,7 @@ bool run_folder(RsyncJob job, const std::string &job_name, const std::string &ro
     bool done = rsync_resolve_folder(root, place.folder) == 0;
     if (done) {
         rsync_write_progress(job_name, place.folder, place.index, place.count);
-        done = set_ends(job, place.folder) && rsync_run_backup(job_name, job) == BACKUP_DONE;
+        done = rsync_set_ends(job, place.folder) && rsync_run_backup(job_name, job) == BACKUP_DONE;
     }
     raise_alert(job, done);
     return done;
@@ -120,7 +95,7 @@ bool run_folder(RsyncJob job, const std::string &job_name, const std::string &ro
 
 bool run_folders(const RsyncJob &job, const std::string &job_name)
 {
-    const std::string root = remote_backup_root(job_name);
+    const std::string root = rsync_remote_root(job_name);
     RsyncJob to_split = job;
     FolderTable folders{};
     rsync_split_folders(to_split, folders);

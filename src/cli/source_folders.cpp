@@ -4,6 +4,7 @@
 #include "common/handles.h"
 #include "common/job_files.h"
 #include "common/private_file.h"
+#include "common/run_options.h"
 #include "platform/device.h"
 
 #include <cstdio>
@@ -101,6 +102,30 @@ int rsync_resolve_folder(const std::string &remote_backup_root, const std::strin
     const char *const share = shares.holding(folder);
     if (share == nullptr || !fill_buffers(remote_backup_root, share, folder)) return -1;
     return chdir(share_path);
+}
+
+std::string rsync_remote_root(const std::string &job_name)
+{
+    char serial[SERIAL_SIZE] = "";
+    rsync_read_serial(serial);
+    if (std::strpbrk(serial, "\r\n") != nullptr) {
+        DebugLog("ERROR: line break in the serial text of [%s]: no remote folder can be named\n",
+                 SERIAL_FILE);
+    }
+    return format_text("/%s_remote_backup/%s", serial, job_name.c_str());
+}
+
+bool rsync_set_ends(RsyncJob &job, const std::string &folder)
+{
+    std::string remote_path = std::string(job.remote_path) + share_remote_dir;
+    if (run_options.restore_mode == 1) {
+        copy_text(job.local_path, share_path);
+    } else {
+        remote_path += folder.substr(std::strlen(share_path));
+    }
+    if (copy_text(job.remote_path, remote_path)) return true;
+    DebugLog("ERROR: remote_path refused: too long\n");
+    return false;
 }
 
 void rsync_write_progress(const std::string &job_name, const std::string &folder, int index, int count)

@@ -6,25 +6,16 @@
 #include "config/job_store.h"
 #include "config/schedule.h"
 
-#include <functional>
-
 namespace bakjob
 {
 
 namespace
 {
 
-// `change` works on the loaded list and says whether to save it.
+// A save that fails is not the operations' to tell.
 int change_jobs(const std::function<bool()> &change)
 {
-    const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
-    rsync_load_jobs();
-    if (!change()) {
-        rsync_free_jobs();
-        return 0;
-    }
-    rsync_save_jobs();
-    return 1;
+    return rsync_change_jobs(change) == JobChange::NONE ? 0 : 1;
 }
 
 int change_job(const std::string &job_name, const std::function<bool(RsyncJob &)> &change)
@@ -57,6 +48,17 @@ int read_job(const std::string &job_name, const std::function<void(const RsyncJo
 }
 
 } // namespace
+
+JobChange rsync_change_jobs(const std::function<bool()> &change)
+{
+    const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
+    rsync_load_jobs();
+    if (!change()) {
+        rsync_free_jobs();
+        return JobChange::NONE;
+    }
+    return rsync_save_jobs() ? JobChange::SAVED : JobChange::NOT_SAVED;
+}
 
 int rsync_enable_job(const std::string &job_name)
 {

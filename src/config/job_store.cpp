@@ -130,7 +130,7 @@ void rsync_load_jobs()
     }
 }
 
-void rsync_save_jobs()
+bool rsync_save_jobs()
 {
     xml_del(JOBS);
     if (rsync_job_list_empty() == 0) xml_set_int(JOB_COUNT, job_list->count);
@@ -139,8 +139,9 @@ void rsync_save_jobs()
         save_job(*job, ++item);
     }
     rsync_prune_schedule();
-    xml_write_file(CONFIG_FILE);
+    const bool written = xml_write_file(CONFIG_FILE) >= 0;
     rsync_free_jobs();
+    return written;
 }
 
 } // namespace bakjob

@@ -8,13 +8,13 @@ namespace bakjob
 {
 
 // Empties the list and fills it with every job of the store. Texts are cut at their field's width, which
-// `cut_fields` tells; numbers
-// out of their range take their default; the second of two jobs of one name is left out.
+// `cut_fields` tells; numbers out of their range take their default; the second of two jobs of one name is
+// left out.
 void rsync_load_jobs();
 
 // Writes the list in place of the stored jobs, numbered from 1, deletes scheduler entries that name no job
 // any more, writes the configuration file and empties the list. A text that the load had to cut is saved
-// whole unless it was changed.
-void rsync_save_jobs();
+// whole unless it was changed. False when the file could not be written.
+bool rsync_save_jobs();
 
 } // namespace bakjob

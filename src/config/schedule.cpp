@@ -51,9 +51,14 @@ std::string entry_path(int entry)
     return format_text("%s/item:%d", GROUP_NODE, entry);
 }
 
+std::string entry_text(int entry, const char *key)
+{
+    return store_text(entry_path(entry) + '/' + key, TEXT_SIZE + 1);
+}
+
 std::string entry_command(int entry)
 {
-    return store_text(entry_path(entry) + "/run", TEXT_SIZE + 1);
+    return entry_text(entry, "run");
 }
 
 void delete_entry(int entry, int entries_left)
@@ -75,6 +80,45 @@ bool is_kept(const std::string &command)
     return command.size() == TEXT_SIZE || rsync_schedule_names_job(command) == 1;
 }
 
+bool names(std::string_view command, std::string_view job_name)
+{
+    return contains(command, '\'' + std::string(job_name) + '\'');
+}
+
+bool belongs_to(const std::string &command, std::string_view job_name)
+{
+    if (!names(command, job_name)) return false;
+    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+        const std::string_view other = job->job_name;
+        if (other.size() > job_name.size() && names(command, other)) return false;
+    }
+    return true;
+}
+
+// Deletes the entries whose command `goes`; how many. The last one takes the group along.
+template <class Goes>
+int delete_entries(const Goes &goes)
+{
+    const Group group = find_group();
+    if (group.name_path.empty()) return 0;
+    const int entries = bounded_count(ENTRY_COUNT);
+    int remaining = entries;
+    int entry = 1; // the entries behind a deleted one move up to its number
+    for (int visited = 0; visited < entries; ++visited) {
+        if (!goes(entry_command(entry))) {
+            ++entry;
+        } else if (remaining == 1) {
+            delete_group(group);
+            LIB_do_ctc();
+            return entries;
+        } else {
+            delete_entry(entry, --remaining);
+        }
+    }
+    if (remaining != entries) LIB_do_ctc();
+    return entries - remaining;
+}
+
 int first_entry_holding(const char *job_name, int entries)
 {
     for (int entry = 1; entry <= entries; ++entry) {
@@ -88,31 +132,33 @@ int first_entry_holding(const char *job_name, int entries)
 int rsync_schedule_names_job(std::string_view command)
 {
     for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
-        if (contains(command, format_text("'%s'", job->job_name))) return 1;
+        if (names(command, job->job_name)) return 1;
     }
     return 0;
 }
 
 void rsync_prune_schedule()
 {
-    const Group group = find_group();
-    if (group.name_path.empty()) return;
-    const int entries = bounded_count(ENTRY_COUNT);
-    int remaining = entries;
-    int entry = 1; // the entries behind a deleted one move up to its number
-    for (int visited = 0; visited < entries; ++visited) {
-        if (is_kept(entry_command(entry))) {
-            ++entry;
-            continue;
-        }
-        if (remaining == 1) {
-            delete_group(group);
-            LIB_do_ctc();
-            return;
-        }
-        delete_entry(entry, --remaining);
+    delete_entries([](const std::string &command) { return !is_kept(command); });
+}
+
+std::vector<ScheduleEntry> rsync_job_schedule(std::string_view job_name)
+{
+    std::vector<ScheduleEntry> found;
+    const int entries = find_group().name_path.empty() ? 0 : bounded_count(ENTRY_COUNT);
+    for (int entry = 1; entry <= entries; ++entry) {
+        const std::string command = entry_command(entry);
+        if (!belongs_to(command, job_name)) continue;
+        const auto text = [&](const char *key) { return entry_text(entry, key); };
+        found.push_back({text("minute"), text("hour"), text("day"), text("month"), text("weekday"),
+                         text("user"), command});
     }
-    if (remaining != entries) LIB_do_ctc();
+    return found;
+}
+
+int rsync_unschedule_job(std::string_view job_name)
+{
+    return delete_entries([&](const std::string &command) { return belongs_to(command, job_name); });
 }
 
 void rsync_remove_job_schedule(const char *job_name)
@@ -140,11 +186,12 @@ void rsync_remove_job_schedule(const char *job_name)
     LIB_do_ctc();
 }
 
-void rsync_create_schedule(const char *minute, const char *hour, const char *day, const char *month,
-                           const char *weekday, const char *user, const char *run)
+int rsync_create_schedule(const char *minute, const char *hour, const char *day, const char *month,
+                          const char *weekday, const char *user, const char *run)
 {
-    LIB_create_xml(minute, hour, day, month, weekday, user, run, GROUP);
-    LIB_do_ctc();
+    const int created = LIB_create_xml(minute, hour, day, month, weekday, user, run, GROUP);
+    const int taken_over = LIB_do_ctc();
+    return created >= 0 && taken_over >= 0 ? 1 : 0;
 }
 
 void rsync_delete_schedule()

@@ -3,10 +3,24 @@
 // The scheduler's entries for backup jobs: the group "rsync" of the scheduler's part of the configuration
 // store. An entry names its job in the command that it runs.
 
+#include <string>
 #include <string_view>
+#include <vector>
 
 namespace bakjob
 {
+
+// When an entry runs, in cron's notation, and what.
+struct ScheduleEntry {
+    std::string minute, hour, day, month, weekday, user, run;
+};
+
+// The entries of a job: their command holds its name in single quotes, and that of no job of the job list
+// with a longer name.
+std::vector<ScheduleEntry> rsync_job_schedule(std::string_view job_name);
+
+// Deletes them; how many there were. Does not write the configuration file.
+int rsync_unschedule_job(std::string_view job_name);
 
 // Deletes the entries that name no job of the job list; the last one left takes the group with it. Does not
 // write the configuration file: the save that it is part of does.
@@ -18,9 +32,9 @@ int rsync_schedule_names_job(std::string_view command);
 // Deletes the first entry whose command holds the name anywhere, and then writes the configuration file.
 void rsync_remove_job_schedule(const char *job_name);
 
-// Adds an entry in cron's notation and has the scheduler take it over.
-void rsync_create_schedule(const char *minute, const char *hour, const char *day, const char *month,
-                           const char *weekday, const char *user, const char *run);
+// Adds an entry and has the scheduler take it over. 1 when both did so, else 0.
+int rsync_create_schedule(const char *minute, const char *hour, const char *day, const char *month,
+                          const char *weekday, const char *user, const char *run);
 
 // Deletes all entries for backup jobs.
 void rsync_delete_schedule();

@@ -46,11 +46,16 @@ std::optional<SshTestResult> judge_ssh_reply(std::string_view line)
     return line.empty() ? SSH_FAILED : SSH_OK;
 }
 
+std::optional<std::string> ssh_test_command(const RsyncJob &job)
+{
+    const auto login = ssh_login_of(job);
+    return login ? ssh_command(job, *login, "ls / 2>&1") : std::nullopt;
+}
+
 SshTestResult ssh_test()
 {
     if (CurrentJob.remote_ip[0] == '\0') return SSH_FAILED;
-    const auto login = ssh_login_of(CurrentJob);
-    const auto command = login ? ssh_command(CurrentJob, *login, "ls / 2>&1") : std::nullopt;
+    const auto command = ssh_test_command(CurrentJob);
     DebugLog("ssh_test cmd[%s]\n", command ? command->c_str() : "");
     if (!command) return SSH_FAILED;
 

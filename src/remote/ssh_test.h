@@ -6,6 +6,7 @@
 
 #include <cstdint>
 #include <optional>
+#include <string>
 #include <string_view>
 
 namespace bakjob
@@ -23,6 +24,9 @@ enum SshTestResult : std::int32_t {
 // Tests the login of CurrentJob. When the host's key has changed, the stored key is removed and the login is
 // tried once more.
 SshTestResult ssh_test();
+
+// The command of the test; nothing when a value is refused.
+std::optional<std::string> ssh_test_command(const RsyncJob &job);
 
 // What the first line of a login's reply means; nothing: the host's key has changed.
 std::optional<SshTestResult> judge_ssh_reply(std::string_view line);
