@@ -7,7 +7,6 @@
 #include "remote/daemon_config.h"
 #include "remote/ssh_login.h"
 
-#include <optional>
 #include <unistd.h>
 
 namespace bakjob
@@ -48,15 +47,21 @@ int make_remote_dir(const std::string &folder, const std::string &target)
 
 } // namespace
 
-int rsync_prepare_remote_dir(const std::string &job_name, const std::string &module, const std::string &first,
-                             const std::string &second)
+std::optional<std::string> rsync_find_module_folder(const std::string &job_name, const std::string &module)
 {
     const std::string local_copy = remote_config_copy(job_name);
     unlink(local_copy.c_str());
-    if (!fetch_daemon_config(local_copy)) return -1;
-    const auto folder = module_folder(local_copy, module);
+    if (!fetch_daemon_config(local_copy)) return std::nullopt;
+    auto folder = module_folder(local_copy, module);
     unlink(local_copy.c_str());
     sync();
+    return folder;
+}
+
+int rsync_prepare_remote_dir(const std::string &job_name, const std::string &module, const std::string &first,
+                             const std::string &second)
+{
+    const auto folder = rsync_find_module_folder(job_name, module);
     return folder ? make_remote_dir(*folder, first + '/' + second) : -1;
 }
 

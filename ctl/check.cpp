@@ -1,0 +1,78 @@
+// check: what would make a run fail, found before it runs.
+
+#include "commands.h"
+#include "failure.h"
+#include "findings.h"
+#include "jobs.h"
+#include "output.h"
+
+#include <algorithm>
+#include <array>
+#include <cstdio>
+
+namespace bakjob::ctl
+{
+
+namespace
+{
+
+constexpr std::array VERDICTS = {"fine", "note", "problem"};
+
+const char *verdict_of(const Finding &finding)
+{
+    return VERDICTS.at(static_cast<std::size_t>(finding.verdict));
+}
+
+// Advice speaks of the job NAME.
+std::string with_name(std::string text, const std::string &name)
+{
+    constexpr std::string_view PLACE = "NAME";
+    const std::size_t place = text.find(PLACE);
+    return place == std::string::npos ? text : text.replace(place, PLACE.size(), name_for_shell(name));
+}
+
+void print_findings(const Findings &findings)
+{
+    for (const Finding &finding : findings) {
+        std::printf("%-8s %s: %s\n", verdict_of(finding), printable(finding.about).c_str(),
+                    printable(finding.what).c_str());
+        if (!finding.todo.empty()) std::printf("         %s\n", printable(finding.todo).c_str());
+    }
+}
+
+Json json_of(const Findings &findings)
+{
+    Json list = Json::array();
+    for (const Finding &finding : findings) {
+        list.push_back({{"verdict", verdict_of(finding)},
+                        {"about", finding.about},
+                        {"what", finding.what},
+                        {"todo", finding.todo}});
+    }
+    return list;
+}
+
+} // namespace
+
+int check_job(const Request &request)
+{
+    const StoredJob job = read_job(request.name);
+    Findings findings;
+    check_here(job.record, job.schedule, findings);
+    if (request.probe) check_remote_side(job.record, findings);
+    for (Finding &finding : findings) {
+        finding.todo = with_name(finding.todo, request.name);
+    }
+    const auto problems = std::count_if(findings.begin(), findings.end(), [](const Finding &finding) {
+        return finding.verdict == Verdict::PROBLEM;
+    });
+    if (request.json) {
+        print_json(json_of(findings));
+    } else {
+        print_findings(findings);
+        std::printf("%s: %td problem%s\n", request.name.c_str(), problems, problems == 1 ? "" : "s");
+    }
+    return problems == 0 ? EXIT_FINE : EXIT_TROUBLE;
+}
+
+} // namespace bakjob::ctl

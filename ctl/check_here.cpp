@@ -1,0 +1,219 @@
+#include "cli/job_state.h"
+#include "cli/source_folders.h"
+#include "common/folder_table.h"
+#include "common/job_files.h"
+#include "common/password.h"
+#include "common/shell_text.h"
+#include "common/text.h"
+#include "config/current_job.h"
+#include "cron.h"
+#include "failure.h"
+#include "fields.h"
+#include "findings.h"
+#include "summary.h"
+#include "transfer/rsync_command.h"
+
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <unistd.h>
+
+namespace bakjob::ctl
+{
+
+namespace
+{
+
+class Check
+{
+public:
+    Check(const RsyncJob &job, Findings &findings) : job_(job), findings_(findings) {}
+
+    void problem(const std::string &about, const std::string &what, const std::string &todo)
+    {
+        findings_.push_back({Verdict::PROBLEM, about, what, todo});
+    }
+    void note(const std::string &about, const std::string &what, const std::string &todo)
+    {
+        findings_.push_back({Verdict::NOTE, about, what, todo});
+    }
+
+    void values();
+    void passwords();
+    void schedule(const std::vector<ScheduleEntry> &entries);
+    void runs();
+    void snapshots();
+    void programs();
+    void serial();
+    void folders();
+
+private:
+    void folder(const std::string &root, const std::string &folder);
+    void missing_folder(const std::string &folder);
+    void share_of(const std::string &root, const std::string &folder);
+
+    const RsyncJob &job_;
+    Findings &findings_;
+};
+
+void Check::values()
+{
+    if (!is_job_name(job_.job_name)) {
+        problem("job_name", "no run takes this name", "Add the job anew under another name.");
+    }
+    for (const JobField &field : job_fields()) {
+        const std::string why = refusal_of(job_, field);
+        const bool unused = job_.inc_enable != 1 && std::strcmp(field.key, "inc_number") == 0;
+        if (!why.empty() && !unused) {
+            problem(field.key, why, "bakjobctl set NAME " + std::string(field.key) + "=VALUE");
+        }
+    }
+    if (job_.enable == 0) problem("enable", "the job is switched off", "bakjobctl enable NAME");
+}
+
+void Check::passwords()
+{
+    char plain[PASSWORD_SIZE] = "";
+    const bool encoded = job_.pwd_encoded != 0;
+    if (!encoded || password_decode(plain, job_.rsync_pwd, sizeof plain) < 0) {
+        problem("rsync_pwd", "it has no base64 form, so it is too long or damaged",
+                "bakjobctl set NAME rsync_pwd=-");
+    }
+    char again[PASSWORD_SIZE] = "";
+    if (*job_.ssh_pwd != '\0' && password_decode(again, job_.ssh_pwd, sizeof again) < 0) {
+        problem("ssh_pwd", "it is not kept in base64", "bakjobctl set NAME ssh_pwd=-");
+    }
+}
+
+void Check::schedule(const std::vector<ScheduleEntry> &entries)
+{
+    if (entries.empty() && job_.schedule_mode == SCHEDULE_TIMETABLE) {
+        note("timetable", "there is none: nothing starts the job by itself",
+             "bakjobctl schedule NAME \"0 3 * * *\" runs it every day at three.");
+    }
+    if (entries.size() > 1) {
+        note("timetable", "there are " + std::to_string(entries.size()) + " entries",
+             "bakjobctl schedule NAME TIMES leaves one.");
+    }
+    for (const ScheduleEntry &entry : entries) {
+        try {
+            parse_cron_times(times_of(entry));
+        } catch (const Failure &failure) {
+            problem("timetable", failure.what(), "bakjobctl schedule NAME TIMES");
+        }
+    }
+}
+
+void Check::runs()
+{
+    const Run run = run_of(job_.job_name);
+    if (run == Run::GOING_ON) note("run", "one is going on now", "bakjobctl watch NAME follows it.");
+    if (run == Run::LEFT_BEHIND) {
+        problem("run", "one died and left " + pid_file(job_.job_name) + ", so every other is refused",
+                "bakjob -k NAME clears that.");
+    }
+    if (run == Run::NONE && rsync_state_is_running(job_.state) == 1) {
+        note("state", "it says that a run is going on, but there is none", "bakjob -a clears that.");
+    }
+    if (job_.schedule_mode == SCHEDULE_ONCE && job_.state != JOB_IDLE) {
+        problem(
+            "schedule_mode", "the job runs once, and has run",
+            "bakjob -b -r NAME runs it again; schedule_mode=timetable lets it run as often as it is told.");
+    }
+}
+
+void Check::snapshots()
+{
+    if (job_.inc_enable == 1 && job_.backup_type == BACKUP_PUSH) {
+        note("inc_enable", "only a job that pulls keeps snapshots", "bakjobctl set NAME inc_enable=no");
+    }
+}
+
+void Check::programs()
+{
+    constexpr std::array PROGRAMS = {"/usr/sbin/bakjob", "/usr/sbin/rsync", "/usr/sbin/ssh",
+                                     "/usr/sbin/ssh-keygen", "/bin/sh"};
+    for (const char *const program : PROGRAMS) {
+        if (access(program, X_OK) != 0) problem(program, std::strerror(errno), "Install it.");
+    }
+}
+
+void Check::serial()
+{
+    char serial[SERIAL_SIZE] = "";
+    if (rsync_read_serial(serial) < 0 || *serial == '\0') {
+        note(SERIAL_FILE, "it holds no serial text: the folder on the remote side has none in its name",
+             "On the appliance it is written at its start.");
+    } else if (std::strpbrk(serial, "\r\n") != nullptr) {
+        problem(SERIAL_FILE, "its text has a line break: no remote folder can be named",
+                "Write it without one.");
+    }
+}
+
+void Check::folders()
+{
+    const std::string root = rsync_remote_root(job_.job_name);
+    RsyncJob to_split = job_;
+    FolderTable folders{};
+    rsync_split_folders(to_split, folders);
+    if (folders.count == 0)
+        problem("local_path", "there is no folder", "bakjobctl set NAME local_path=FOLDER");
+    for (int i = 0; i < folders.count; ++i) {
+        folder(root, folders.entries[i]);
+    }
+}
+
+void Check::share_of(const std::string &root, const std::string &folder)
+{
+    if (rsync_resolve_folder(root, folder) == 0) return;
+    if (*share_path == '\0') {
+        problem(folder, "no share holds it", "local_path names folders of the appliance's shares.");
+    } else {
+        problem(folder, std::string("its share's folder ") + share_path + " cannot be entered",
+                "Is the volume there?");
+    }
+}
+
+void Check::missing_folder(const std::string &folder)
+{
+    const bool pulls = job_.backup_type != BACKUP_PUSH;
+    if (pulls && job_.inc_enable != 1) {
+        note(folder, "it is not there: what a run fetches lands in a folder of that name inside of it",
+             "Make it first.");
+    } else {
+        problem(folder, std::strerror(errno), "Make it, or name another.");
+    }
+}
+
+void Check::folder(const std::string &root, const std::string &folder)
+{
+    const std::size_t before = findings_.size();
+    share_of(root, folder);
+    if (findings_.size() == before && access(folder.c_str(), F_OK) != 0) missing_folder(folder);
+    if (findings_.size() != before) return;
+    RsyncJob ended = job_;
+    const bool fits = copy_text(ended.local_path, folder) && rsync_set_ends(ended, folder);
+    rsync_prepare_current_job(ended);
+    if (!fits || !rsync_build_command(ended)) {
+        problem(folder, "its transfer's command is refused",
+                "remote_path and the folder are too long together, or hold what no command can; "
+                "bakjob -d -r NAME says which.");
+    }
+}
+
+} // namespace
+
+void check_here(const RsyncJob &job, const std::vector<ScheduleEntry> &schedule, Findings &findings)
+{
+    Check check(job, findings);
+    check.values();
+    check.passwords();
+    check.schedule(schedule);
+    check.runs();
+    check.snapshots();
+    check.programs();
+    check.serial();
+    check.folders();
+}
+
+} // namespace bakjob::ctl

@@ -1,0 +1,75 @@
+#include "jobs.h"
+
+#include "common/job_files.h"
+#include "common/shell_text.h"
+#include "config/config_lock.h"
+#include "config/job_list.h"
+#include "config/job_operations.h"
+#include "config/job_store.h"
+#include "failure.h"
+#include "platform/device.h"
+
+namespace bakjob::ctl
+{
+
+namespace
+{
+
+[[noreturn]] void no_such_job(const std::string &name)
+{
+    throw Failure("there is no job \"" + name + "\"; bakjobctl list shows those that there are");
+}
+
+} // namespace
+
+std::vector<StoredJob> read_jobs()
+{
+    const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
+    rsync_load_jobs();
+    std::vector<StoredJob> jobs;
+    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+        rsync_copy_job(jobs.emplace_back().record, *job);
+        jobs.back().schedule = rsync_job_schedule(job->job_name);
+    }
+    rsync_free_jobs();
+    return jobs;
+}
+
+StoredJob read_job(const std::string &name)
+{
+    for (StoredJob &job : read_jobs()) {
+        if (name == job.record.job_name) return std::move(job);
+    }
+    no_such_job(name);
+}
+
+void change_jobs(const std::function<void()> &change)
+{
+    const JobChange changed = rsync_change_jobs([&] {
+        change();
+        return true;
+    });
+    if (changed != JobChange::SAVED) {
+        throw Failure("the configuration could not be written; it is as it was");
+    }
+    const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
+    if (LIB_CP_Config_To_MTD(1) < 0) {
+        throw Failure("the configuration is changed, but could not be copied to flash");
+    }
+}
+
+void change_job(const std::string &name, const std::function<void(RsyncJob &)> &change)
+{
+    change_jobs([&] {
+        RsyncJob *const job = rsync_find_job(name);
+        if (job == nullptr) no_such_job(name);
+        change(*job);
+    });
+}
+
+std::string name_for_shell(const std::string &name)
+{
+    return shell_word(name) == name ? name : in_single_quotes(name);
+}
+
+} // namespace bakjob::ctl

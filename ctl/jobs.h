@@ -1,0 +1,35 @@
+#pragma once
+
+// Jobs as the commands need them: read whole, or changed, saved and copied to flash.
+
+#include "config/job.h"
+#include "config/schedule.h"
+
+#include <functional>
+#include <string>
+#include <vector>
+
+namespace bakjob::ctl
+{
+
+struct StoredJob {
+    RsyncJob record;
+    std::vector<ScheduleEntry> schedule;
+};
+
+std::vector<StoredJob> read_jobs();
+
+// Failure when there is no job of that name.
+StoredJob read_job(const std::string &name);
+
+// Runs `change` on the loaded job list under the configuration lock, saves, and copies the configuration to
+// flash. Nothing is saved when `change` throws; Failure when the save or the copy fails.
+void change_jobs(const std::function<void()> &change);
+
+// The same for one job.
+void change_job(const std::string &name, const std::function<void(RsyncJob &)> &change);
+
+// A job's name as a word of a shell's command line.
+std::string name_for_shell(const std::string &name);
+
+} // namespace bakjob::ctl

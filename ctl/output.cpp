@@ -1,0 +1,63 @@
+#include "output.h"
+
+#include <algorithm>
+#include <cstdio>
+
+namespace bakjob::ctl
+{
+
+namespace
+{
+
+// Columns that a UTF-8 text takes, its combined and double-width characters aside.
+std::size_t width_of(std::string_view text)
+{
+    return static_cast<std::size_t>(
+        std::count_if(text.begin(), text.end(), [](char c) { return (c & 0xC0) != 0x80; }));
+}
+
+} // namespace
+
+std::string printable(std::string_view text)
+{
+    std::string result(text);
+    std::replace_if(
+        result.begin(), result.end(),
+        [](char c) {
+            const auto code = static_cast<unsigned char>(c);
+            return code < ' ' || code == 127;
+        },
+        '?');
+    return result;
+}
+
+void print_table(const Row &header, const std::vector<Row> &rows)
+{
+    std::vector<Row> all;
+    if (!header.empty()) all.push_back(header);
+    all.insert(all.end(), rows.begin(), rows.end());
+    std::vector<std::size_t> widths;
+    for (Row &row : all) {
+        widths.resize(std::max(widths.size(), row.size()));
+        for (std::size_t i = 0; i < row.size(); ++i) {
+            row[i] = printable(row[i]);
+            widths[i] = std::max(widths[i], width_of(row[i]));
+        }
+    }
+    for (const Row &row : all) {
+        std::string line;
+        for (std::size_t i = 0; i < row.size(); ++i) {
+            line += row[i];
+            if (i + 1 < row.size()) line.append(widths[i] - width_of(row[i]) + 2, ' ');
+        }
+        std::puts(line.c_str());
+    }
+}
+
+void print_json(const Json &value, int indent)
+{
+    std::puts(value.dump(indent, ' ', false, Json::error_handler_t::replace).c_str());
+    std::fflush(stdout);
+}
+
+} // namespace bakjob::ctl

@@ -1,0 +1,25 @@
+#pragma once
+
+// What the commands print: tables for people, JSON for programs.
+
+#include <nlohmann/json.hpp>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace bakjob::ctl
+{
+
+using Json = nlohmann::ordered_json;
+using Row = std::vector<std::string>;
+
+// The text with what a terminal would act on replaced by '?'.
+std::string printable(std::string_view text);
+
+// Columns as wide as their widest text, two blanks between them. An empty header prints none.
+void print_table(const Row &header, const std::vector<Row> &rows);
+
+// Text that is no UTF-8 has its bad bytes replaced. `indent` -1: one line.
+void print_json(const Json &value, int indent = 2);
+
+} // namespace bakjob::ctl
