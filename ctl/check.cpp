@@ -28,7 +28,9 @@ std::string with_name(std::string text, const std::string &name)
 {
     constexpr std::string_view PLACE = "NAME";
     const std::size_t place = text.find(PLACE);
-    return place == std::string::npos ? text : text.replace(place, PLACE.size(), name_for_shell(name));
+    const bool option = name.starts_with('-') && text.starts_with("bakjobctl");
+    const std::string word = (option ? "-- " : "") + name_for_shell(name);
+    return place == std::string::npos ? text : text.replace(place, PLACE.size(), word);
 }
 
 void print_findings(const Findings &findings)

@@ -1,17 +1,13 @@
 #include "cli/source_folders.h"
 #include "common/folder_table.h"
-#include "common/shell.h"
 #include "common/text.h"
 #include "config/current_job.h"
 #include "findings.h"
-#include "remote/daemon_test.h"
+#include "probe.h"
 #include "remote/remote_dir.h"
-#include "remote/ssh_login.h"
 #include "transfer/backup.h"
 #include "words.h"
 
-#include <algorithm>
-#include <optional>
 #include <unistd.h>
 
 namespace bakjob::ctl
@@ -19,29 +15,6 @@ namespace bakjob::ctl
 
 namespace
 {
-
-struct Answer {
-    RemoteReplyCode code;
-    std::string line;
-};
-
-// Replies that name no known failure pass for success in a run, which then fails in its transfer.
-RemoteReplyCode judge(std::string_view line)
-{
-    const RemoteReplyCode code = classify_reply_line(line);
-    const bool unknown = line.starts_with("rsync:") || line.starts_with("rsync error") ||
-                         line.starts_with("ssh:") || contains(line, "Permission denied") ||
-                         contains(line, "verification failed");
-    return code == REPLY_OK && unknown ? REPLY_ERROR : code;
-}
-
-Answer ask(const std::optional<std::string> &command)
-{
-    if (!command || !fits_command(*command)) return {REPLY_ERROR, "a value is refused"};
-    const auto line = first_reply_line(*command);
-    if (!line) return {REPLY_ERROR, "the command could not be started"};
-    return {judge(*line), *line};
-}
 
 // A job of this process's own, with the values of the one that is looked at: its password file is nobody
 // else's, not even a run's that begins meanwhile.
@@ -67,63 +40,127 @@ private:
     bool ready_ = false;
 };
 
-void report(const std::string &about, const Advice &advice, const std::string &line, Findings &findings)
+class RemoteCheck
+{
+public:
+    RemoteCheck(const RsyncJob &job, const ProbeJob &probe, Findings &findings)
+        : job_(job), probe_(probe), findings_(findings)
+    {
+    }
+
+    // True when there is more to ask.
+    bool login();
+    bool daemon();
+    bool target();
+
+    void folder(const std::string &folder);
+
+private:
+    void add(Verdict verdict, const std::string &about, const std::string &what, const char *todo = "")
+    {
+        findings_.push_back({verdict, about, what, todo});
+    }
+    void report(const std::string &about, const Advice &advice, const std::string &line);
+    void missing(const std::string &folder, const std::string &line);
+    void preparation(const std::string &folder);
+
+    [[nodiscard]] bool to_module() const { return job_.rsync_mode == RSYNC_MODE_DAEMON; }
+
+    const RsyncJob &job_;
+    const ProbeJob &probe_;
+    Findings &findings_;
+};
+
+void RemoteCheck::report(const std::string &about, const Advice &advice, const std::string &line)
 {
     const bool fine = *advice.todo == '\0';
-    const std::string answer = fine || line.empty() ? "" : " (" + line + ")";
-    findings.push_back({fine ? Verdict::FINE : Verdict::PROBLEM, about, advice.what + answer, advice.todo});
+    const std::string answer = fine || line.empty() ? "" : ": " + line;
+    add(fine ? Verdict::FINE : Verdict::PROBLEM, about, advice.what + answer, advice.todo);
 }
 
-bool login_works(SshLogin login, Findings &findings)
+// The login of the transfer itself. Without `use_ssh`, a path on the host is reached by keys alone.
+bool RemoteCheck::login()
 {
-    const auto command = ssh_command(CurrentJob, login, "ls / 2>&1");
-    const auto reply = command ? first_reply_line(*command) : std::nullopt;
-    const auto result = reply ? judge_ssh_reply(*reply) : SSH_FAILED;
-    const bool as_client = login == SshLogin::as_client;
-    report(as_client ? "ssh login without a name" : std::string("ssh login as ") + CurrentJob.ssh_user,
-           advice_of_login(result), reply.value_or(""), findings);
-    return result == SSH_OK;
+    if (job_.use_ssh != 1 && to_module()) return true;
+    const auto kind = job_.use_ssh == 1 ? ssh_login_of(job_) : SshLogin::as_client;
+    if (!kind) return false; // the values say why
+    const RsyncJob kept = CurrentJob;
+    if (job_.use_ssh != 1) CurrentJob.ssh_pwd[0] = '\0';
+    const LoginReply reply = try_login(*kind);
+    rsync_copy_job(CurrentJob, kept);
+    report("ssh login", advice_of_login(reply.result), reply.line);
+    return reply.result == SSH_OK;
+}
+
+bool RemoteCheck::daemon()
+{
+    const DaemonReply reply = ask_daemon();
+    if (reply.result != REPLY_OK) {
+        report("rsync daemon", advice_of_reply(reply.result), reply.line);
+        return false;
+    }
+    add(Verdict::FINE, "rsync daemon", "answers");
+    return true;
+}
+
+// The daemon's module, before its folders: what is missing there is for each of them to say.
+bool RemoteCheck::target()
+{
+    if (!to_module()) return true;
+    const DaemonReply reply = try_transfer();
+    if (reply.result == REPLY_NO_DIR) return true;
+    report("remote_path", advice_of_reply(reply.result), reply.line);
+    return reply.result == REPLY_OK;
 }
 
 // What a run would do about a folder that is missing at the target of a push to a module.
-void check_preparation(const ProbeJob &probe, const std::string &folder, Findings &findings)
+void RemoteCheck::preparation(const std::string &folder)
 {
     const std::string path = CurrentJob.remote_path;
     const std::string module = path.substr(0, path.find('/'));
-    if (!login_works(SshLogin::as_client, findings)) {
-        findings.push_back({Verdict::PROBLEM, folder,
-                            "is not on the remote side yet, and a run makes it by this login",
-                            "Give ssh_pwd the password of the remote root, or make /" + path + " there."});
-    } else if (!rsync_find_module_folder(probe.name(), module)) {
-        findings.push_back({Verdict::PROBLEM, folder,
-                            "is not on the remote side yet, and /etc/rsyncd.conf there has no \"[ " + module +
-                                " ]\" with a \"path = \" line that says where",
-                            "Make the folder there, or write the module so."});
+    const LoginReply reply = try_login(SshLogin::as_client);
+    if (reply.result != SSH_OK) {
+        add(Verdict::PROBLEM, folder,
+            "is not there yet, and the ssh login by which a run makes it " +
+                std::string(advice_of_login(reply.result).what) + ": " + reply.line,
+            "Give ssh_pwd the password of root over there, or make the folder there.");
+    } else if (!rsync_find_module_folder(probe_.name(), module)) {
+        add(Verdict::PROBLEM, folder,
+            "is not there yet, and /etc/rsyncd.conf over there has no header \"[ " + module +
+                " ]\" with a \"path = \" line, by which a run finds where to make it",
+            "Write both so, or make the folder there.");
     } else {
-        findings.push_back({Verdict::FINE, folder, "is not on the remote side yet; the run makes it"});
+        add(Verdict::FINE, folder, "is not there yet; the run makes it");
     }
 }
 
-void check_folder(const RsyncJob &job, const ProbeJob &probe, const std::string &folder, Findings &findings)
+void RemoteCheck::missing(const std::string &folder, const std::string &line)
 {
-    RsyncJob ended = job;
-    const bool found = rsync_resolve_folder(rsync_remote_root(job.job_name), folder) == 0;
+    if (job_.backup_type != BACKUP_PUSH) {
+        report(folder, {"is not there", "A pull fetches what lies in the folder of this name over there."},
+               line);
+    } else if (to_module()) {
+        preparation(folder);
+    } else {
+        add(Verdict::NOTE, folder, std::string("is not there yet: ") + CurrentJob.remote_path,
+            "The run makes only the last folder of this path.");
+    }
+}
+
+void RemoteCheck::folder(const std::string &folder)
+{
+    RsyncJob ended = job_;
+    const bool found = rsync_resolve_folder(rsync_remote_root(job_.job_name), folder) == 0;
     if (!found || !copy_text(ended.local_path, folder) || !rsync_set_ends(ended, folder)) return;
     copy_text(CurrentJob.remote_path, ended.remote_path);
-    const Answer answer = ask(write_test_command(CurrentJob, 0));
-    const bool to_module = job.backup_type == BACKUP_PUSH && job.rsync_mode == RSYNC_MODE_DAEMON;
-    if (answer.code == REPLY_NO_DIR && to_module) {
-        check_preparation(probe, folder, findings);
-    } else if (answer.code == REPLY_NO_DIR && job.backup_type == BACKUP_PULL) {
-        report(folder,
-               {"is not on the remote side", "A pull fetches what lies there in the folder of this name."},
-               answer.line, findings);
-    } else if (answer.code == REPLY_NO_DIR) {
-        findings.push_back({Verdict::NOTE, folder,
-                            std::string("is not on the remote side yet: ") + ended.remote_path,
-                            "The run makes the last folder of this path only."});
+    const DaemonReply reply = try_transfer();
+    if (reply.result == REPLY_NO_DIR) {
+        missing(folder, reply.line);
+    } else if (to_module() || reply.result == REPLY_OK) {
+        report(folder, advice_of_reply(reply.result), reply.line);
     } else {
-        report(folder + " on the remote side", advice_of_reply(answer.code), answer.line, findings);
+        // A run goes on, too: its transfer logs in otherwise than this probe of it.
+        add(Verdict::NOTE, folder, "cannot be looked at: " + reply.line);
     }
 }
 
@@ -132,18 +169,15 @@ void check_folder(const RsyncJob &job, const ProbeJob &probe, const std::string 
 void check_remote_side(const RsyncJob &job, Findings &findings)
 {
     const ProbeJob probe(job);
-    const auto login = ssh_login_of(job);
-    if (!login || !probe.ready()) return; // the values say why
-    if (job.use_ssh == 1 && !login_works(*login, findings)) return;
-    const Answer daemon = ask(module_list_command(CurrentJob));
-    report("rsync daemon", advice_of_reply(daemon.code), daemon.line, findings);
-    if (daemon.code != REPLY_OK) return;
+    if (!probe.ready()) return; // the values say why
+    RemoteCheck check(job, probe, findings);
+    if (!check.login() || !check.daemon() || !check.target()) return;
 
     RsyncJob to_split = job;
     FolderTable folders{};
     rsync_split_folders(to_split, folders);
     for (int i = 0; i < folders.count; ++i) {
-        check_folder(job, probe, folders.entries[i], findings);
+        check.folder(folders.entries[i]);
     }
 }
 

@@ -62,7 +62,7 @@ int add_job(const Request &request)
 {
     if (!is_job_name(request.name)) {
         throw Failure(
-            "\"" + printable(request.name) +
+            "\"" + request.name +
             "\" is not allowed as a job's name; allowed: up to 127 bytes without / \" \\ | < > * ? and "
             "control characters");
     }

@@ -185,7 +185,9 @@ const std::vector<FieldRule> &field_rules()
                {{1, "path"}, {2, "module"}}),
         choice("schedule_mode", "when the job runs", {{1, "timetable"}, {2, "once"}, {3, "event"}}),
         choice("use_ssh", "whether the transfer goes through ssh", NO_YES),
-        choice("keep_exist_file", "what becomes of files at the target",
+        choice("keep_exist_file",
+               "files at the target: mirror deletes what is gone, keep leaves all as they are, update "
+               "deletes nothing",
                {{0, "mirror"}, {1, "keep"}, {2, "update"}}),
         choice("inc_enable", "whether a job that pulls keeps snapshots", NO_YES),
         number("inc_number", "how many snapshots", 3, 10),

@@ -69,7 +69,8 @@ void change_job(const std::string &name, const std::function<void(RsyncJob &)> &
 
 std::string name_for_shell(const std::string &name)
 {
-    return shell_word(name) == name ? name : in_single_quotes(name);
+    const bool plain = shell_word(name) == name && name.find_first_of("!~") == std::string::npos;
+    return plain ? name : in_single_quotes(name);
 }
 
 } // namespace bakjob::ctl

@@ -115,7 +115,10 @@ int show_status(const Request &request)
     }
     std::vector<Row> rows;
     for (const Summary &summary : summaries) {
-        rows.push_back({summary.name + ':', summary.last, summary.time, summary.enabled ? "" : "disabled"});
+        const std::string restore =
+            summary.restore.empty() ? "" : "restore " + summary.restore + "  " + summary.restore_time;
+        rows.push_back(
+            {summary.name + ':', summary.last, summary.time, summary.enabled ? "" : "disabled", restore});
     }
     print_table({}, rows);
     return exit_status_of(summaries);
@@ -127,13 +130,14 @@ int show_keys(const Request &request)
     Json list = Json::array();
     for (const FieldRule &rule : field_rules()) {
         if (rule.kind == FieldKind::OWN) continue;
-        rows.push_back(request.names ? Row{rule.key} : Row{rule.key, rule.meaning, allowed_values(rule)});
+        rows.push_back(request.names ? Row{rule.key} : Row{rule.key, rule.meaning});
+        if (!request.names) rows.push_back({"", allowed_values(rule)});
         list.push_back({{"key", rule.key}, {"meaning", rule.meaning}, {"allowed", allowed_values(rule)}});
     }
     if (request.json) {
         print_json(list);
     } else {
-        print_table(request.names ? Row{} : Row{"KEY", "MEANING", "ALLOWED"}, rows);
+        print_table(request.names ? Row{} : Row{"KEY", "MEANING, AND WHAT IS ALLOWED"}, rows);
     }
     return EXIT_FINE;
 }

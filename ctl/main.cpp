@@ -2,6 +2,7 @@
 
 #include "commands.h"
 #include "failure.h"
+#include "output.h"
 
 #include <CLI/CLI.hpp>
 #include <array>
@@ -94,7 +95,7 @@ int main(int argc, char **argv)
     } catch (const CLI::ParseError &end) {
         return app.exit(end) == 0 ? EXIT_FINE : EXIT_REFUSED;
     } catch (const std::exception &failure) {
-        std::fprintf(stderr, "bakjobctl: %s\n", failure.what());
+        std::fprintf(stderr, "bakjobctl: %s\n", printable(failure.what()).c_str());
         return EXIT_REFUSED;
     }
 }

@@ -48,8 +48,9 @@ void print_table(const Row &header, const std::vector<Row> &rows)
         std::string line;
         for (std::size_t i = 0; i < row.size(); ++i) {
             line += row[i];
-            if (i + 1 < row.size()) line.append(widths[i] - width_of(row[i]) + 2, ' ');
+            line.append(widths[i] - width_of(row[i]) + 2, ' ');
         }
+        line.resize(line.find_last_not_of(' ') + 1);
         std::puts(line.c_str());
     }
 }

@@ -27,9 +27,6 @@ void judge(Summary &summary, const RsyncJob &job)
         summary.outcome = Outcome::FAILED;
         summary.last = "interrupted";
     }
-    if (job.rstate != JOB_IDLE && job.rstate != -1) {
-        summary.last += std::string("; restore ") + words_of_state(job.rstate).words;
-    }
     if (!summary.enabled && summary.outcome == Outcome::FAILED) summary.outcome = Outcome::FINE;
 }
 
@@ -49,6 +46,7 @@ std::string times_of(const ScheduleEntry &entry)
 Summary summary_of(const StoredJob &job)
 {
     const RsyncJob &record = job.record;
+    const bool restored = record.rstate != JOB_IDLE && record.rstate != -1;
     Summary summary{.name = record.job_name,
                     .direction = word_of("backup_type", record.backup_type),
                     .remote = record.remote_ip,
@@ -57,6 +55,8 @@ Summary summary_of(const StoredJob &job)
                     .outcome = Outcome::FINE,
                     .last = {},
                     .time = record.last_do_job_time,
+                    .restore = restored ? words_of_state(record.rstate).words : "",
+                    .restore_time = restored ? record.rlast_do_job_time : "",
                     .schedule = job.schedule.empty() ? "" : times_of(job.schedule.front())};
     const bool brackets = ip_address_kind(record.remote_ip) != ADDRESS_IPV4;
     if (brackets) summary.remote = '[' + summary.remote + ']';
@@ -77,6 +77,8 @@ Json json_of(const Summary &summary)
             {"outcome", OUTCOMES[static_cast<int>(summary.outcome)]},
             {"last", summary.last},
             {"time", summary.time},
+            {"restore", summary.restore},
+            {"restore_time", summary.restore_time},
             {"schedule", summary.schedule}};
 }
 

@@ -25,9 +25,11 @@ struct Summary {
     std::string remote;
     bool enabled;
     Run run;
-    Outcome outcome;      // of the backup; a job that is switched off or never ran is fine
-    std::string last;     // in words, with the restore if there was one
-    std::string time;     // when that was recorded, empty for a job that never ran
+    Outcome outcome;     // of the backup; a job that is switched off or never ran is fine
+    std::string last;    // in words
+    std::string time;    // when that was recorded, empty for a job that never ran
+    std::string restore; // how the last restore ended, empty when there was none; it is not judged
+    std::string restore_time;
     std::string schedule; // in cron's notation, empty for none
 };
 

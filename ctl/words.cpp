@@ -32,7 +32,7 @@ struct ReplyRow {
 };
 
 constexpr std::array REPLIES = {
-    ReplyRow{REPLY_OK, {"is fine", ""}},
+    ReplyRow{REPLY_OK, {"lets the job in", ""}},
     ReplyRow{REPLY_ERROR, {"reports an error", "The answer says which; the daemon's log may say more."}},
     ReplyRow{
         REPLY_NO_ROUTE,
@@ -62,8 +62,8 @@ struct LoginRow {
 };
 
 constexpr std::array LOGINS = {
-    LoginRow{SSH_OK, {"is fine", ""}},
-    LoginRow{SSH_FAILED, {"fails without an answer", "Look at remote_ip and the ssh server's log."}},
+    LoginRow{SSH_OK, {"is let in", ""}},
+    LoginRow{SSH_FAILED, {"fails", "Look at remote_ip and the ssh server's log."}},
     LoginRow{SSH_NO_ROUTE,
              {"fails: no route to the host", "Look at remote_ip, the cable and whether it is on."}},
     LoginRow{SSH_REFUSED,

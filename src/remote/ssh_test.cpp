@@ -5,7 +5,6 @@
 #include "common/shell.h"
 #include "common/text.h"
 #include "config/current_job.h"
-#include "remote/ssh_login.h"
 
 #include <array>
 #include <string>
@@ -46,16 +45,16 @@ std::optional<SshTestResult> judge_ssh_reply(std::string_view line)
     return line.empty() ? SSH_FAILED : SSH_OK;
 }
 
-std::optional<std::string> ssh_test_command(const RsyncJob &job)
+std::optional<std::string> ssh_test_command(const RsyncJob &job, SshLogin login)
 {
-    const auto login = ssh_login_of(job);
-    return login ? ssh_command(job, *login, "ls / 2>&1") : std::nullopt;
+    return ssh_command(job, login, "ls / 2>&1");
 }
 
 SshTestResult ssh_test()
 {
     if (CurrentJob.remote_ip[0] == '\0') return SSH_FAILED;
-    const auto command = ssh_test_command(CurrentJob);
+    const auto login = ssh_login_of(CurrentJob);
+    const auto command = login ? ssh_test_command(CurrentJob, *login) : std::nullopt;
     DebugLog("ssh_test cmd[%s]\n", command ? command->c_str() : "");
     if (!command) return SSH_FAILED;
 

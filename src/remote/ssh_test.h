@@ -3,6 +3,7 @@
 // Proves that the remote host accepts an ssh login without asking, by running the harmless "ls /" there.
 
 #include "config/job.h"
+#include "remote/ssh_login.h"
 
 #include <cstdint>
 #include <optional>
@@ -26,7 +27,7 @@ enum SshTestResult : std::int32_t {
 SshTestResult ssh_test();
 
 // The command of the test; nothing when a value is refused.
-std::optional<std::string> ssh_test_command(const RsyncJob &job);
+std::optional<std::string> ssh_test_command(const RsyncJob &job, SshLogin login);
 
 // What the first line of a login's reply means; nothing: the host's key has changed.
 std::optional<SshTestResult> judge_ssh_reply(std::string_view line);
