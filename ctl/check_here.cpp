@@ -68,6 +68,10 @@ void Check::values()
             problem(field.key, why, "bakjobctl set NAME " + std::string(field.key) + "=VALUE");
         }
     }
+    if (job_.rsync_mode == RSYNC_MODE_DAEMON && *job_.remote_path == '/') {
+        problem("remote_path", "it begins with a slash instead of the daemon's module",
+                "bakjobctl set NAME remote_path=MODULE/FOLDER, or rsync_mode=path");
+    }
     if (job_.enable == 0) problem("enable", "the job is switched off", "bakjobctl enable NAME");
 }
 

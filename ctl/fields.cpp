@@ -30,8 +30,10 @@ bool is_host(std::string_view text)
     return !text.empty() && is_safe_host(text);
 }
 
+// A run takes blanks behind the number.
 bool is_port(std::string_view text)
 {
+    text = text.substr(0, text.find_last_not_of(' ') + 1);
     int port = 0;
     const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), port);
     return error == std::errc() && end == text.data() + text.size() && port >= 1 && port <= 65535;

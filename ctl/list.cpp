@@ -118,7 +118,7 @@ int show_status(const Request &request)
         const std::string restore =
             summary.restore.empty() ? "" : "restore " + summary.restore + "  " + summary.restore_time;
         rows.push_back(
-            {summary.name + ':', summary.last, summary.time, summary.enabled ? "" : "disabled", restore});
+            {summary.name + ':', summary.last, summary.time, restore, summary.enabled ? "" : "disabled"});
     }
     print_table({}, rows);
     return exit_status_of(summaries);

@@ -9,11 +9,15 @@ namespace bakjob::ctl
 namespace
 {
 
+bool begins_character(char c)
+{
+    return (c & 0xC0) != 0x80;
+}
+
 // Columns that a UTF-8 text takes, its combined and double-width characters aside.
 std::size_t width_of(std::string_view text)
 {
-    return static_cast<std::size_t>(
-        std::count_if(text.begin(), text.end(), [](char c) { return (c & 0xC0) != 0x80; }));
+    return static_cast<std::size_t>(std::count_if(text.begin(), text.end(), begins_character));
 }
 
 } // namespace
@@ -29,6 +33,15 @@ std::string printable(std::string_view text)
         },
         '?');
     return result;
+}
+
+std::string_view fitting(std::string_view text, std::size_t columns)
+{
+    std::size_t length = 0;
+    while (length < text.size() && (columns > 0 || !begins_character(text[length]))) {
+        if (begins_character(text[length++])) --columns;
+    }
+    return text.substr(0, length);
 }
 
 void print_table(const Row &header, const std::vector<Row> &rows)

@@ -16,6 +16,9 @@ using Row = std::vector<std::string>;
 // The text with what a terminal would act on replaced by '?'.
 std::string printable(std::string_view text);
 
+// The start of the text that fits so many columns.
+std::string_view fitting(std::string_view text, std::size_t columns);
+
 // Columns as wide as their widest text, two blanks between them. An empty header prints none.
 void print_table(const Row &header, const std::vector<Row> &rows);
 

@@ -14,6 +14,7 @@
 #include <cstdio>
 #include <fstream>
 #include <optional>
+#include <sys/ioctl.h>
 #include <thread>
 #include <unistd.h>
 
@@ -28,7 +29,7 @@ using Clock = std::chrono::steady_clock;
 constexpr auto LOOK_EVERY = std::chrono::milliseconds(200);
 constexpr auto WAIT_FOR_START = std::chrono::seconds(3);
 constexpr auto LINE_EVERY = std::chrono::seconds(5); // where lines stay
-constexpr int BAR_WIDTH = 30;
+constexpr std::size_t BAR_WIDTH = 30;
 
 struct Figures {
     std::uint64_t files;
@@ -125,16 +126,24 @@ public:
     }
 
 private:
+    // A line that is longer than the terminal is wide could not be drawn over.
     void draw(const Progress &progress)
     {
         const auto share = per_cent(progress);
-        const int filled = share ? *share * BAR_WIDTH / 100 : 0;
-        const std::string bar = std::string(static_cast<std::size_t>(filled), '#') +
-                                std::string(static_cast<std::size_t>(BAR_WIDTH - filled), '.');
-        std::printf("\r\033[K%s%s%s", share ? ("[" + bar + "] ").c_str() : "", words_of(progress).c_str(),
-                    "");
+        const auto filled = static_cast<std::size_t>(share.value_or(0)) * BAR_WIDTH / 100;
+        const std::string bar = '[' + std::string(filled, '#') + std::string(BAR_WIDTH - filled, '.') + "] ";
+        const std::string line = (share ? bar : "") + words_of(progress);
+        std::printf("\r\033[K%s", std::string(fitting(line, columns())).c_str());
         std::fflush(stdout);
         drawn_ = true;
+    }
+
+    static std::size_t columns()
+    {
+        winsize size{};
+        constexpr std::size_t USUAL = 80;
+        const bool known = ioctl(STDOUT_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col > 0;
+        return (known ? size.ws_col : USUAL) - 1;
     }
 
     bool json_;
