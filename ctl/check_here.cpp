@@ -56,6 +56,16 @@ private:
     Findings &findings_;
 };
 
+// Whether a run looks at the key. An appliance of the same kind has logins of its own.
+bool is_used(const RsyncJob &job, std::string_view key)
+{
+    const bool named = job.server_type != SERVER_SAME_KIND;
+    if (key == "inc_number") return job.inc_enable == 1;
+    if (key == "rsync_user") return named && job.rsync_mode == RSYNC_MODE_DAEMON;
+    if (key == "ssh_user") return named && job.use_ssh == 1;
+    return true;
+}
+
 void Check::values()
 {
     if (!is_job_name(job_.job_name)) {
@@ -63,14 +73,17 @@ void Check::values()
     }
     for (const JobField &field : job_fields()) {
         const std::string why = refusal_of(job_, field);
-        const bool unused = job_.inc_enable != 1 && std::strcmp(field.key, "inc_number") == 0;
-        if (!why.empty() && !unused) {
+        if (!why.empty() && is_used(job_, field.key)) {
             problem(field.key, why, "bakjobctl set NAME " + std::string(field.key) + "=VALUE");
         }
     }
     if (job_.rsync_mode == RSYNC_MODE_DAEMON && *job_.remote_path == '/') {
         problem("remote_path", "it begins with a slash instead of the daemon's module",
                 "bakjobctl set NAME remote_path=MODULE/FOLDER, or rsync_mode=path");
+    }
+    if (*job_.rsync_pwd_file != '\0' && password_file(job_.job_name) != job_.rsync_pwd_file) {
+        problem("rsync_pwd_file", "the probes before a transfer read another one",
+                "Delete the job and add it anew.");
     }
     if (job_.enable == 0) problem("enable", "the job is switched off", "bakjobctl enable NAME");
 }

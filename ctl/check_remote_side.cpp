@@ -25,6 +25,7 @@ public:
     {
         copy_text(job_.job_name, "bakjobctl." + std::to_string(getpid()));
         job_.rsync_pwd_file[0] = '\0';
+        if (job_.server_type == SERVER_SAME_KIND) copy_text(job_.rsync_user, "root"); // as the transfer does
         rsync_prepare_current_job(job_);
         ready_ = rsync_write_password_file() || job.rsync_mode != RSYNC_MODE_DAEMON;
     }
@@ -116,8 +117,14 @@ bool RemoteCheck::target()
 // What a run would do about a folder that is missing at the target of a push to a module.
 void RemoteCheck::preparation(const std::string &folder)
 {
-    const std::string path = CurrentJob.remote_path;
-    const std::string module = path.substr(0, path.find('/'));
+    const std::string module = job_.remote_path;
+    if (contains(module, "/")) {
+        add(Verdict::PROBLEM, folder,
+            std::string("is not there yet, and a run makes it only where remote_path is a module alone: ") +
+                CurrentJob.remote_path,
+            "Make this folder there.");
+        return;
+    }
     const LoginReply reply = try_login(SshLogin::as_client);
     if (reply.result != SSH_OK) {
         add(Verdict::PROBLEM, folder,

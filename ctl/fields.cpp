@@ -61,16 +61,16 @@ bool is_folder_list(std::string_view text)
     }
 }
 
-constexpr const char *NAME_RULE = "no blank, nothing that a shell acts on, no dash in front";
+constexpr const char *NAME_RULE = "not empty, no blank, nothing that a shell acts on, no dash in front";
 
-bool is_ssh_or_empty(std::string_view text)
+bool is_ssh_user(std::string_view text)
 {
-    return text.empty() || is_safe_ssh_user(text);
+    return !text.empty() && is_safe_ssh_user(text);
 }
 
-bool is_rsync_or_empty(std::string_view text)
+bool is_rsync_user(std::string_view text)
 {
-    return text.empty() || is_safe_rsync_user(text);
+    return !text.empty() && is_safe_rsync_user(text);
 }
 
 bool is_password(std::string_view text)
@@ -198,10 +198,10 @@ const std::vector<FieldRule> &field_rules()
         number("rsync_timeout", "seconds of silence that end a transfer, 0 for none", 0, INT_MAX),
         own("last_do_job_time", "when the state was recorded"),
         own("job_name", "part of the folders' names on both sides, so it stays as it was added"),
-        text("rsync_user", "login at the daemon", is_rsync_or_empty, NAME_RULE),
+        text("rsync_user", "login at the daemon", is_rsync_user, NAME_RULE),
         text("rsync_pwd", "its password, empty for the default", is_password, PASSWORD_RULE,
              FieldKind::SECRET),
-        text("ssh_user", "login at the ssh server", is_ssh_or_empty, NAME_RULE),
+        text("ssh_user", "login at the ssh server", is_ssh_user, NAME_RULE),
         text("ssh_pwd", "its password, empty for keys", is_password, PASSWORD_RULE, FieldKind::SECRET),
         text("port", "the daemon's port", is_port, "1 to 65535"),
         text("remote_ip", "address or host name", is_host, NAME_RULE),
@@ -238,6 +238,7 @@ std::vector<Setting> parse_settings(const std::vector<std::string> &texts,
                                     const std::function<std::string(const std::string &key)> &ask)
 {
     std::vector<Setting> settings;
+    settings.reserve(texts.size());
     for (const std::string &text : texts) {
         settings.push_back(parse_setting(text, ask));
     }

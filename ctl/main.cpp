@@ -2,7 +2,6 @@
 
 #include "commands.h"
 #include "failure.h"
-#include "output.h"
 
 #include <CLI/CLI.hpp>
 #include <array>
@@ -79,9 +78,7 @@ int act(const CLI::App &app, const Request &request)
     throw Failure("no such command");
 }
 
-} // namespace
-
-int main(int argc, char **argv)
+int run(int argc, char **argv)
 {
     CLI::App app("Manages backup jobs. bakjob runs them.", "bakjobctl");
     app.require_subcommand(1);
@@ -91,11 +88,20 @@ int main(int argc, char **argv)
     }
     try {
         app.parse(argc, argv);
-        return act(app, request);
     } catch (const CLI::ParseError &end) {
         return app.exit(end) == 0 ? EXIT_FINE : EXIT_REFUSED;
+    }
+    return act(app, request);
+}
+
+} // namespace
+
+int main(int argc, char **argv)
+{
+    try {
+        return run(argc, argv);
     } catch (const std::exception &failure) {
-        std::fprintf(stderr, "bakjobctl: %s\n", printable(failure.what()).c_str());
+        std::fprintf(stderr, "bakjobctl: %s\n", failure.what());
         return EXIT_REFUSED;
     }
 }

@@ -64,7 +64,7 @@ bool discover(RsyncJob &job)
     rsync_prepare_current_job(job);
     if (rsync_list_daemon_modules() != 0) {
         const std::string why = module_list->head == nullptr ? "no answer" : module_list->head->name;
-        throw Failure("the rsync daemon cannot be asked: " + why);
+        throw Failure("the rsync daemon cannot be asked: " + printable(why));
     }
     return job.rsync_mode == RSYNC_MODE_DAEMON ? measure_modules() : measure_path();
 }

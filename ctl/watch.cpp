@@ -27,7 +27,7 @@ namespace
 using Clock = std::chrono::steady_clock;
 
 constexpr auto LOOK_EVERY = std::chrono::milliseconds(200);
-constexpr auto WAIT_FOR_START = std::chrono::seconds(3);
+constexpr auto WAIT_FOR_START = std::chrono::seconds(1);
 constexpr auto LINE_EVERY = std::chrono::seconds(5); // where lines stay
 constexpr std::size_t BAR_WIDTH = 30;
 
