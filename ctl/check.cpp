@@ -72,7 +72,8 @@ int check_job(const Request &request)
         print_json(json_of(findings));
     } else {
         print_findings(findings);
-        std::printf("%s: %td problem%s\n", request.name.c_str(), problems, problems == 1 ? "" : "s");
+        std::printf("%s: %td problem%s\n", printable(request.name).c_str(), problems,
+                    problems == 1 ? "" : "s");
     }
     return problems == 0 ? EXIT_FINE : EXIT_TROUBLE;
 }

@@ -11,7 +11,7 @@
 #include "fields.h"
 #include "findings.h"
 #include "summary.h"
-#include "transfer/rsync_command.h"
+#include "transfer/backup.h"
 
 #include <array>
 #include <cerrno>
@@ -56,14 +56,24 @@ private:
     Findings &findings_;
 };
 
-// Whether a run looks at the key. An appliance of the same kind has logins of its own.
-bool is_used(const RsyncJob &job, std::string_view key)
+bool pushes_to_module(const RsyncJob &job)
 {
+    return job.backup_type == BACKUP_PUSH && job.rsync_mode == RSYNC_MODE_DAEMON;
+}
+
+// How a run takes a value that could not be set so. An appliance of the same kind has logins of its own; each
+// folder of `local_path` is looked at by itself.
+Verdict verdict_on(const RsyncJob &job, const JobField &field)
+{
+    const std::string_view key = field.key;
     const bool named = job.server_type != SERVER_SAME_KIND;
-    if (key == "inc_number") return job.inc_enable == 1;
-    if (key == "rsync_user") return named && job.rsync_mode == RSYNC_MODE_DAEMON;
-    if (key == "ssh_user") return named && job.use_ssh == 1;
-    return true;
+    if (key == "local_path" && !was_cut(job, key)) return Verdict::FINE;
+    if (key == "inc_number" && job.inc_enable != 1) return Verdict::FINE;
+    if (key == "rsync_user" && (!named || job.rsync_mode != RSYNC_MODE_DAEMON)) return Verdict::FINE;
+    if (key == "ssh_user" && (!named || job.use_ssh != 1)) return Verdict::FINE;
+    if (key == "rsync_user" && *job.rsync_user == '\0') return Verdict::NOTE;
+    return field.in_commands || key == "local_path" || key == "server_type" ? Verdict::PROBLEM
+                                                                            : Verdict::NOTE;
 }
 
 void Check::values()
@@ -73,9 +83,10 @@ void Check::values()
     }
     for (const JobField &field : job_fields()) {
         const std::string why = refusal_of(job_, field);
-        if (!why.empty() && is_used(job_, field.key)) {
-            problem(field.key, why, "bakjobctl set NAME " + std::string(field.key) + "=VALUE");
-        }
+        const Verdict verdict = why.empty() ? Verdict::FINE : verdict_on(job_, field);
+        if (verdict == Verdict::FINE) continue;
+        findings_.push_back(
+            {verdict, field.key, why, "bakjobctl set NAME " + std::string(field.key) + "=VALUE"});
     }
     if (job_.rsync_mode == RSYNC_MODE_DAEMON && *job_.remote_path == '/') {
         problem("remote_path", "it begins with a slash instead of the daemon's module",
@@ -85,6 +96,14 @@ void Check::values()
         problem("rsync_pwd_file", "the probes before a transfer read another one",
                 "Delete the job and add it anew.");
     }
+    if (job_.server_type == SERVER_SAME_KIND && *job_.rsync_user != '\0' &&
+        std::string_view(job_.rsync_user) != "root") {
+        note("rsync_user", "a run looks by it for missing folders, but transfers as root",
+             "bakjobctl set NAME rsync_user=root");
+    }
+    if (std::string_view(job_.port) != DEFAULT_PORT) {
+        note("port", "only the transfer uses it: before it a run asks the daemon on port 873", "");
+    }
     if (job_.enable == 0) problem("enable", "the job is switched off", "bakjobctl enable NAME");
 }
 
@@ -92,14 +111,16 @@ void Check::passwords()
 {
     char plain[PASSWORD_SIZE] = "";
     const bool encoded = job_.pwd_encoded != 0;
-    if (!encoded || password_decode(plain, job_.rsync_pwd, sizeof plain) < 0) {
+    const bool decodes = encoded && password_decode(plain, job_.rsync_pwd, sizeof plain) >= 0;
+    if (job_.rsync_mode == RSYNC_MODE_DAEMON && !decodes) {
         problem("rsync_pwd", "it has no base64 form, so it is too long or damaged",
                 "bakjobctl set NAME rsync_pwd=-");
     }
     char again[PASSWORD_SIZE] = "";
-    if (*job_.ssh_pwd != '\0' && password_decode(again, job_.ssh_pwd, sizeof again) < 0) {
-        problem("ssh_pwd", "it is not kept in base64", "bakjobctl set NAME ssh_pwd=-");
-    }
+    if (*job_.ssh_pwd == '\0' || password_decode(again, job_.ssh_pwd, sizeof again) >= 0) return;
+    const bool used = job_.use_ssh == 1 || pushes_to_module(job_);
+    findings_.push_back({used ? Verdict::PROBLEM : Verdict::NOTE, "ssh_pwd", "it is not kept in base64",
+                         "bakjobctl set NAME ssh_pwd=-"});
 }
 
 void Check::schedule(const std::vector<ScheduleEntry> &entries)
@@ -127,7 +148,7 @@ void Check::runs()
     if (run == Run::GOING_ON) note("run", "one is going on now", "bakjobctl watch NAME follows it.");
     if (run == Run::LEFT_BEHIND) {
         problem("run", "one died and left " + pid_file(job_.job_name) + ", so every other is refused",
-                "bakjob -k NAME clears that.");
+                "rm " + pid_file(job_.job_name) + " and bakjob -a clear that.");
     }
     if (run == Run::NONE && rsync_state_is_running(job_.state) == 1) {
         note("state", "it says that a run is going on, but there is none", "bakjob -a clears that.");
@@ -141,17 +162,30 @@ void Check::runs()
 
 void Check::snapshots()
 {
-    if (job_.inc_enable == 1 && job_.backup_type == BACKUP_PUSH) {
+    if (job_.inc_enable != 1) return;
+    if (job_.backup_type == BACKUP_PUSH) {
         note("inc_enable", "only a job that pulls keeps snapshots", "bakjobctl set NAME inc_enable=no");
+    } else if (std::strchr(job_.local_path, ':') != nullptr) {
+        note("local_path",
+             "snapshots of a job with several folders are kept, but cannot be recovered by bakjob",
+             "Make a job of each folder.");
     }
 }
 
 void Check::programs()
 {
-    constexpr std::array PROGRAMS = {"/usr/sbin/bakjob", "/usr/sbin/rsync", "/usr/sbin/ssh",
-                                     "/usr/sbin/ssh-keygen", "/bin/sh"};
-    for (const char *const program : PROGRAMS) {
-        if (access(program, X_OK) != 0) problem(program, std::strerror(errno), "Install it.");
+    struct Program {
+        const char *path;
+        bool needed;
+    };
+    const bool ssh = job_.use_ssh == 1 || job_.rsync_mode != RSYNC_MODE_DAEMON;
+    const std::array programs = {Program{"/usr/sbin/bakjob", true}, Program{"/usr/sbin/rsync", true},
+                                 Program{"/usr/sbin/ssh", ssh}, Program{"/usr/sbin/ssh-keygen", false},
+                                 Program{"/bin/sh", true}};
+    for (const Program &program : programs) {
+        if (access(program.path, X_OK) == 0) continue;
+        findings_.push_back({program.needed ? Verdict::PROBLEM : Verdict::NOTE, program.path,
+                             std::strerror(errno), "Install it."});
     }
 }
 
@@ -211,7 +245,7 @@ void Check::folder(const std::string &root, const std::string &folder)
     RsyncJob ended = job_;
     const bool fits = copy_text(ended.local_path, folder) && rsync_set_ends(ended, folder);
     rsync_prepare_current_job(ended);
-    if (!fits || !rsync_build_command(ended)) {
+    if (!fits || !rsync_transfer_command(ended)) {
         problem(folder, "its transfer's command is refused",
                 "remote_path and the folder are too long together, or hold what no command can; "
                 "bakjob -d -r NAME says which.");

@@ -1,13 +1,17 @@
 #include "cli/source_folders.h"
 #include "common/folder_table.h"
+#include "common/job_files.h"
 #include "common/text.h"
 #include "config/current_job.h"
 #include "findings.h"
+#include "on_signal.h"
 #include "probe.h"
 #include "remote/remote_dir.h"
 #include "transfer/backup.h"
 #include "words.h"
 
+#include <optional>
+#include <string_view>
 #include <unistd.h>
 
 namespace bakjob::ctl
@@ -15,6 +19,16 @@ namespace bakjob::ctl
 
 namespace
 {
+
+// Files of a probe, to be removed however it ends.
+char password_path[PATH_SIZE];
+char config_path[PATH_SIZE];
+
+void remove_files()
+{
+    unlink(password_path);
+    unlink(config_path);
+}
 
 // A job of this process's own, with the values of the one that is looked at: its password file is nobody
 // else's, not even a run's that begins meanwhile.
@@ -27,17 +41,21 @@ public:
         job_.rsync_pwd_file[0] = '\0';
         if (job_.server_type == SERVER_SAME_KIND) copy_text(job_.rsync_user, "root"); // as the transfer does
         rsync_prepare_current_job(job_);
+        copy_text(password_path, job_.rsync_pwd_file);
+        copy_text(config_path, remote_config_copy(job_.job_name));
+        on_signal_.emplace(remove_files);
         ready_ = rsync_write_password_file() || job.rsync_mode != RSYNC_MODE_DAEMON;
     }
     ProbeJob(const ProbeJob &) = delete;
     ProbeJob &operator=(const ProbeJob &) = delete;
-    ~ProbeJob() { unlink(CurrentJob.rsync_pwd_file); }
+    ~ProbeJob() { remove_files(); }
 
     [[nodiscard]] bool ready() const { return ready_; }
-    [[nodiscard]] std::string name() const { return job_.job_name; }
+    [[nodiscard]] const RsyncJob &job() const { return job_; }
 
 private:
     RsyncJob job_;
+    std::optional<OnSignal> on_signal_;
     bool ready_ = false;
 };
 
@@ -62,7 +80,6 @@ private:
         findings_.push_back({verdict, about, what, todo});
     }
     void report(const std::string &about, const Advice &advice, const std::string &line);
-    void missing(const std::string &folder, const std::string &line);
     void preparation(const std::string &folder);
 
     [[nodiscard]] bool to_module() const { return job_.rsync_mode == RSYNC_MODE_DAEMON; }
@@ -101,14 +118,20 @@ bool RemoteCheck::daemon()
         return false;
     }
     add(Verdict::FINE, "rsync daemon", "answers");
-    return true;
+    if (std::string_view(job_.port) == DEFAULT_PORT || job_.use_ssh == 1) return true;
+    const DaemonReply own = ask_port();
+    if (own.result == REPLY_OK) return true;
+    const std::string port = std::string("port ") + job_.port;
+    report(port, {advice_of_reply(own.result).what, "bakjobctl set NAME port=873, or whatever is right."},
+           own.line);
+    return false;
 }
 
-// The daemon's module, before its folders: what is missing there is for each of them to say.
+// The module of a push, before its folders: what is missing there is for each of them to say.
 bool RemoteCheck::target()
 {
-    if (!to_module()) return true;
-    const DaemonReply reply = try_transfer();
+    if (!to_module() || job_.backup_type != BACKUP_PUSH) return true;
+    const DaemonReply reply = look_for_target();
     if (reply.result == REPLY_NO_DIR) return true;
     report("remote_path", advice_of_reply(reply.result), reply.line);
     return reply.result == REPLY_OK;
@@ -117,8 +140,9 @@ bool RemoteCheck::target()
 // What a run would do about a folder that is missing at the target of a push to a module.
 void RemoteCheck::preparation(const std::string &folder)
 {
-    const std::string module = job_.remote_path;
-    if (contains(module, "/")) {
+    const std::string_view path = job_.remote_path;
+    const std::string module(path.substr(0, path.find('/')));
+    if (path.find_first_not_of('/', module.size()) != std::string_view::npos) {
         add(Verdict::PROBLEM, folder,
             std::string("is not there yet, and a run makes it only where remote_path is a module alone: ") +
                 CurrentJob.remote_path,
@@ -126,12 +150,14 @@ void RemoteCheck::preparation(const std::string &folder)
         return;
     }
     const LoginReply reply = try_login(SshLogin::as_client);
+    const Advice advice = advice_of_login(reply.result);
     if (reply.result != SSH_OK) {
+        const bool denied = reply.result == SSH_DENIED;
         add(Verdict::PROBLEM, folder,
-            "is not there yet, and the ssh login by which a run makes it " +
-                std::string(advice_of_login(reply.result).what) + ": " + reply.line,
-            "Give ssh_pwd the password of root over there, or make the folder there.");
-    } else if (!rsync_find_module_folder(probe_.name(), module)) {
+            "is not there yet, and the ssh login by which a run makes it " + std::string(advice.what) + ": " +
+                reply.line,
+            denied ? "Give ssh_pwd the password of root over there, or make the folder there." : advice.todo);
+    } else if (!rsync_find_module_folder(CurrentJob.job_name, module)) {
         add(Verdict::PROBLEM, folder,
             "is not there yet, and /etc/rsyncd.conf over there has no header \"[ " + module +
                 " ]\" with a \"path = \" line, by which a run finds where to make it",
@@ -141,33 +167,26 @@ void RemoteCheck::preparation(const std::string &folder)
     }
 }
 
-void RemoteCheck::missing(const std::string &folder, const std::string &line)
-{
-    if (job_.backup_type != BACKUP_PUSH) {
-        report(folder, {"is not there", "A pull fetches what lies in the folder of this name over there."},
-               line);
-    } else if (to_module()) {
-        preparation(folder);
-    } else {
-        add(Verdict::NOTE, folder, std::string("is not there yet: ") + CurrentJob.remote_path,
-            "The run makes only the last folder of this path.");
-    }
-}
-
 void RemoteCheck::folder(const std::string &folder)
 {
-    RsyncJob ended = job_;
+    RsyncJob ended = probe_.job();
     const bool found = rsync_resolve_folder(rsync_remote_root(job_.job_name), folder) == 0;
     if (!found || !copy_text(ended.local_path, folder) || !rsync_set_ends(ended, folder)) return;
     copy_text(CurrentJob.remote_path, ended.remote_path);
-    const DaemonReply reply = try_transfer();
-    if (reply.result == REPLY_NO_DIR) {
-        missing(folder, reply.line);
-    } else if (to_module() || reply.result == REPLY_OK) {
-        report(folder, advice_of_reply(reply.result), reply.line);
+    const DaemonReply target = look_for_target();
+    if (target.result == REPLY_NO_DIR && job_.backup_type != BACKUP_PUSH) {
+        report(folder, {"is not there", "A pull fetches what lies in the folder of this name over there."},
+               target.line);
+    } else if (target.result == REPLY_NO_DIR && to_module()) {
+        preparation(folder);
     } else {
-        // A run goes on, too: its transfer logs in otherwise than this probe of it.
-        add(Verdict::NOTE, folder, "cannot be looked at: " + reply.line);
+        DaemonReply transfer = try_transfer(ended);
+        if (transfer.result == REPLY_OK && job_.backup_type == BACKUP_PUSH && !to_module()) {
+            // The dry run of a folder does not say that its parent is missing; that of a file does.
+            copy_text(ended.local_path, "/etc/hosts");
+            transfer = try_transfer(ended);
+        }
+        report(folder, advice_of_reply(transfer.result), transfer.line);
     }
 }
 

@@ -14,6 +14,7 @@ struct Request {
     std::string name;                  // of the job
     std::vector<std::string> settings; // "key=value"
     std::string times;                 // in cron's notation
+    bool named = false;                // whether a name was given at all
     bool json = false;
     bool names = false; // nothing but names, one a line
     bool probe = false; // ask the remote side, too

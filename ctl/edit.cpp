@@ -46,6 +46,13 @@ int set_enable(const Request &request, int enable)
     return EXIT_FINE;
 }
 
+void apply_schedule()
+{
+    if (rsync_apply_schedule() == 0) {
+        throw Failure("the configuration is changed, but the scheduler did not take it over");
+    }
+}
+
 // The scheduler's rule is that an entry holds the job's name in single quotes. A name that has one itself is
 // written for the shell first, and then, behind what starts a comment, as the rule wants it.
 std::string run_command(const std::string &name)
@@ -95,8 +102,10 @@ int delete_job(const Request &request)
         if (run_of(request.name) == Run::GOING_ON) {
             throw Failure("a run of it is going on; bakjob -k " + name_for_shell(request.name) + " ends it");
         }
+        rsync_unschedule_job(request.name);
         rsync_list_remove_job(&job);
     });
+    apply_schedule();
     return EXIT_FINE;
 }
 
@@ -119,7 +128,9 @@ int schedule_job(const Request &request)
         rsync_unschedule_job(request.name);
         const int created = rsync_create_schedule(times[0].c_str(), times[1].c_str(), times[2].c_str(),
                                                   times[3].c_str(), times[4].c_str(), "root", run.c_str());
-        if (created == 0) throw Failure("the scheduler did not take the entry");
+        if (created == 0) {
+            throw Failure("the scheduler did not take the entry over; bakjobctl show tells what it is to do");
+        }
         job.schedule_mode = SCHEDULE_TIMETABLE;
     });
     return EXIT_FINE;
@@ -130,6 +141,7 @@ int unschedule_job(const Request &request)
     change_job(request.name, [&](RsyncJob &) {
         if (rsync_unschedule_job(request.name) == 0) throw Failure("the job has no timetable");
     });
+    apply_schedule();
     return EXIT_FINE;
 }
 

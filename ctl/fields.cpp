@@ -291,10 +291,14 @@ std::string word_of(std::string_view key, int value)
     return "";
 }
 
+bool is_secret(const JobField &field)
+{
+    return find_rule(field.key)->kind == FieldKind::SECRET;
+}
+
 std::string shown_value(const RsyncJob &job, const JobField &field)
 {
-    const FieldRule *const rule = find_rule(field.key);
-    if (rule->kind == FieldKind::SECRET) return *text_field(job, field) == '\0' ? "(none)" : "(set)";
+    if (is_secret(field)) return *text_field(job, field) == '\0' ? "(none)" : "(set)";
     if (field.size != 0) return text_field(job, field);
     const int value = integer_field(job, field);
     const std::string word = word_of(field.key, value);

@@ -61,7 +61,9 @@ RsyncJob job_with_defaults(const std::string &name);
 // The value for people: numbers with their word, secrets only whether there are any.
 std::string shown_value(const RsyncJob &job, const JobField &field);
 
-// Why a field's value would be refused, empty when it would not. Secrets are not looked at.
+bool is_secret(const JobField &field);
+
+// Why a field's value could not be set so, empty when it could. Secrets are not looked at.
 std::string refusal_of(const RsyncJob &job, const JobField &field);
 
 // The word of a number; empty when it has none.

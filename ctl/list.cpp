@@ -7,7 +7,6 @@
 
 #include <algorithm>
 #include <cstdio>
-#include <cstring>
 
 namespace bakjob::ctl
 {
@@ -45,8 +44,7 @@ Json json_of_record(const StoredJob &job)
 {
     Json keys;
     for (const JobField &field : job_fields()) {
-        const bool secret = std::strstr(field.key, "_pwd") != nullptr && field.size == PASSWORD_SIZE;
-        if (secret) {
+        if (is_secret(field)) {
             keys[field.key] = *text_field(job.record, field) != '\0';
         } else if (field.size == 0) {
             keys[field.key] = integer_field(job.record, field);
@@ -105,7 +103,7 @@ int show_job(const Request &request)
 
 int show_status(const Request &request)
 {
-    const auto jobs = request.name.empty() ? read_jobs() : std::vector{read_job(request.name)};
+    const auto jobs = !request.named ? read_jobs() : std::vector{read_job(request.name)};
     // A configuration that is lost or damaged reads as empty: that is not fine.
     if (jobs.empty()) throw Failure("there are no jobs");
     const auto summaries = summaries_of(jobs);

@@ -69,11 +69,14 @@ void add_command(CLI::App &app, const Command &command, Request &request)
     }
 }
 
-int act(const CLI::App &app, const Request &request)
+int act(const CLI::App &app, Request &request)
 {
     if (geteuid() != 0) throw Failure("root is needed");
     for (const Command &command : COMMANDS) {
-        if (app.got_subcommand(command.name)) return command.act(request);
+        if (!app.got_subcommand(command.name)) continue;
+        const CLI::Option *const name = app.get_subcommand(command.name)->get_option_no_throw("NAME");
+        request.named = name != nullptr && name->count() > 0;
+        return command.act(request);
     }
     throw Failure("no such command");
 }
@@ -99,7 +102,10 @@ int run(int argc, char **argv)
 int main(int argc, char **argv)
 {
     try {
-        return run(argc, argv);
+        const int status = run(argc, argv);
+        if (std::fflush(stdout) == 0 && std::ferror(stdout) == 0) return status;
+        std::perror("bakjobctl: standard output");
+        return EXIT_REFUSED;
     } catch (const std::exception &failure) {
         std::fprintf(stderr, "bakjobctl: %s\n", failure.what());
         return EXIT_REFUSED;

@@ -25,13 +25,13 @@ std::size_t width_of(std::string_view text)
 std::string printable(std::string_view text)
 {
     std::string result(text);
-    std::replace_if(
-        result.begin(), result.end(),
-        [](char c) {
-            const auto code = static_cast<unsigned char>(c);
-            return code < ' ' || code == 127;
-        },
-        '?');
+    unsigned char before = 0;
+    for (char &c : result) {
+        const auto code = static_cast<unsigned char>(c);
+        const bool second_set = before == 0xC2 && code >= 0x80 && code < 0xA0; // in UTF-8
+        if (code < ' ' || code == 127 || second_set) c = '?';
+        before = code;
+    }
     return result;
 }
 

@@ -1,9 +1,11 @@
 #include "probe.h"
 
 #include "common/shell.h"
+#include "common/shell_text.h"
 #include "common/text.h"
 #include "config/current_job.h"
 #include "remote/daemon_test.h"
+#include "transfer/backup.h"
 
 namespace bakjob::ctl
 {
@@ -52,9 +54,26 @@ DaemonReply ask_daemon()
     return reply_of(module_list_command(CurrentJob));
 }
 
-DaemonReply try_transfer()
+DaemonReply ask_port()
+{
+    auto command = module_list_command(CurrentJob);
+    constexpr std::string_view PROGRAM = "/usr/sbin/rsync";
+    if (command && is_safe_port(CurrentJob.port)) {
+        command->insert(PROGRAM.size(), std::string(" --port=") + CurrentJob.port);
+    }
+    return reply_of(command);
+}
+
+DaemonReply look_for_target()
 {
     return reply_of(write_test_command(CurrentJob, 0));
+}
+
+DaemonReply try_transfer(const RsyncJob &job)
+{
+    const auto command = rsync_transfer_command(job);
+    if (!command) return {REPLY_ERROR, "a value is refused"};
+    return reply_of(*command + " --no-recursive --dirs --dry-run 2>&1");
 }
 
 } // namespace bakjob::ctl

@@ -2,6 +2,7 @@
 
 // Questions to the remote side of CurrentJob. They change nothing there.
 
+#include "config/job.h"
 #include "remote/reply.h"
 #include "remote/ssh_login.h"
 #include "remote/ssh_test.h"
@@ -25,7 +26,13 @@ using LoginReply = Reply<std::optional<SshTestResult>>;
 LoginReply try_login(SshLogin login);
 
 using DaemonReply = Reply<RemoteReplyCode>;
-DaemonReply ask_daemon();   // for its modules
-DaemonReply try_transfer(); // of the whole remote_path, in the job's direction
+DaemonReply ask_daemon(); // for its modules
+DaemonReply ask_port();   // the same, at the job's own port
+
+// What a run looks by whether `remote_path` is there.
+DaemonReply look_for_target();
+
+// The transfer of a job with one folder and its two ends, as a dry run that does not go into folders.
+DaemonReply try_transfer(const RsyncJob &job);
 
 } // namespace bakjob::ctl

@@ -34,10 +34,13 @@ bool is_measured(const RemoteModule &module)
 // an appliance of the same kind use it. False when it is not let in.
 bool measure_modules()
 {
-    if (try_login(SshLogin::as_client).result != SSH_OK) return false;
-    CurrentJob.server_type = SERVER_SAME_KIND;
-    rsync_discover_remote();
-    if (rsync_module_list_empty() == 1) rsync_list_daemon_modules();
+    const bool let_in = try_login(SshLogin::as_client).result == SSH_OK;
+    if (let_in) {
+        CurrentJob.server_type = SERVER_SAME_KIND;
+        rsync_discover_remote();
+    }
+    if (!let_in || rsync_module_list_empty() == 1) rsync_list_daemon_modules();
+    if (!let_in) return false;
     // Each direction asks for what it needs alone.
     if (CurrentJob.backup_type == BACKUP_PULL) {
         rsync_remote_free_space(module_list->remote_free);
@@ -51,6 +54,7 @@ bool measure_modules()
 
 bool measure_path()
 {
+    rsync_list_daemon_modules();
     const auto login = ssh_login_of(CurrentJob);
     if (!login || try_login(*login).result != SSH_OK) return false;
     rsync_remote_du(CurrentJob.remote_path, module_list->remote_size);
@@ -62,9 +66,9 @@ bool measure_path()
 bool discover(RsyncJob &job)
 {
     rsync_prepare_current_job(job);
-    if (rsync_list_daemon_modules() != 0) {
-        const std::string why = module_list->head == nullptr ? "no answer" : module_list->head->name;
-        throw Failure("the rsync daemon cannot be asked: " + printable(why));
+    const DaemonReply reply = ask_daemon();
+    if (reply.result != REPLY_OK) {
+        throw Failure("the rsync daemon cannot be asked: " + printable(reply.line));
     }
     return job.rsync_mode == RSYNC_MODE_DAEMON ? measure_modules() : measure_path();
 }

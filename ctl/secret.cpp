@@ -1,8 +1,8 @@
 #include "secret.h"
 
 #include "failure.h"
+#include "on_signal.h"
 
-#include <csignal>
 #include <cstdio>
 #include <iostream>
 #include <termios.h>
@@ -14,34 +14,30 @@ namespace bakjob::ctl
 namespace
 {
 
-void end_the_read(int /*signal*/) {}
+termios usual_terminal;
 
-// A terminal that shows nothing for as long as this lives. An interrupt only ends the read, so that the
-// terminal is as it was when the program ends.
+void restore_terminal()
+{
+    tcsetattr(STDIN_FILENO, TCSAFLUSH, &usual_terminal);
+}
+
+// A terminal that shows nothing for as long as this lives, and cannot be left by a stop.
 class SilentTerminal
 {
 public:
     SilentTerminal()
     {
-        struct sigaction action = {};
-        action.sa_handler = end_the_read;
-        sigaction(SIGINT, &action, &on_interrupt_);
-        tcgetattr(STDIN_FILENO, &before_);
-        termios silent = before_;
+        termios silent = usual_terminal;
         silent.c_lflag &= ~static_cast<tcflag_t>(ECHO);
+        silent.c_cc[VSUSP] = _POSIX_VDISABLE;
         tcsetattr(STDIN_FILENO, TCSAFLUSH, &silent);
     }
     SilentTerminal(const SilentTerminal &) = delete;
     SilentTerminal &operator=(const SilentTerminal &) = delete;
-    ~SilentTerminal()
-    {
-        tcsetattr(STDIN_FILENO, TCSAFLUSH, &before_);
-        sigaction(SIGINT, &on_interrupt_, nullptr);
-    }
+    ~SilentTerminal() { restore_terminal(); }
 
 private:
-    termios before_{};
-    struct sigaction on_interrupt_ = {};
+    OnSignal on_signal_{restore_terminal};
 };
 
 } // namespace
@@ -50,7 +46,7 @@ std::string read_secret(const std::string &what)
 {
     std::string secret;
     bool read = false;
-    if (isatty(STDIN_FILENO) == 1) {
+    if (tcgetattr(STDIN_FILENO, &usual_terminal) == 0) {
         std::fprintf(stderr, "%s: ", what.c_str());
         const SilentTerminal silent;
         read = static_cast<bool>(std::getline(std::cin, secret));

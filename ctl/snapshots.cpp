@@ -8,6 +8,7 @@
 #include "output.h"
 
 #include <cstdio>
+#include <cstring>
 #include <optional>
 
 namespace bakjob::ctl
@@ -18,8 +19,13 @@ namespace
 
 void require_snapshots(const RsyncJob &job)
 {
-    if (job.backup_type == BACKUP_PULL && job.inc_enable == 1 && job.enable == 1) return;
-    throw Failure("the job keeps no snapshots: that takes enable=yes, backup_type=pull and inc_enable=yes");
+    if (job.backup_type != BACKUP_PULL || job.inc_enable != 1 || job.enable != 1) {
+        throw Failure(
+            "the job keeps no snapshots: that takes enable=yes, backup_type=pull and inc_enable=yes");
+    }
+    if (std::strchr(job.local_path, ':') != nullptr) {
+        throw Failure("the job has several folders; bakjob recovers snapshots of jobs with one");
+    }
 }
 
 // The number that -n takes for the snapshot; nothing for a folder that only looks like one.

@@ -11,7 +11,7 @@ namespace bakjob::ctl
 namespace
 {
 
-// State and outcome are told apart: a state that claims a run is only believed when there is one.
+// A state that claims a run is only believed when there is one.
 void judge(Summary &summary, const RsyncJob &job)
 {
     const StateWords state = words_of_state(job.state);
@@ -19,7 +19,6 @@ void judge(Summary &summary, const RsyncJob &job)
     summary.outcome = state.outcome;
     if (summary.run == Run::GOING_ON) {
         summary.outcome = Outcome::RUNNING;
-        if (state.outcome != Outcome::RUNNING) summary.last = "restoring";
     } else if (summary.run == Run::LEFT_BEHIND) {
         summary.outcome = Outcome::FAILED;
         summary.last = "died in a run";

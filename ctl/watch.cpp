@@ -1,20 +1,24 @@
 // watch: follows a run of a job to its end.
 
+#include "cli/job_state.h"
 #include "commands.h"
 #include "common/job_files.h"
-#include "common/shell_text.h"
+#include "common/private_file.h"
 #include "common/text.h"
 #include "failure.h"
 #include "jobs.h"
+#include "on_signal.h"
 #include "summary.h"
 
 #include <algorithm>
 #include <chrono>
 #include <cstdint>
 #include <cstdio>
-#include <fstream>
+#include <fcntl.h>
 #include <optional>
+#include <sstream>
 #include <sys/ioctl.h>
+#include <sys/stat.h>
 #include <thread>
 #include <unistd.h>
 
@@ -27,9 +31,10 @@ namespace
 using Clock = std::chrono::steady_clock;
 
 constexpr auto LOOK_EVERY = std::chrono::milliseconds(200);
-constexpr auto WAIT_FOR_START = std::chrono::seconds(1);
+constexpr auto WAIT_FOR_START = std::chrono::seconds(3);
 constexpr auto LINE_EVERY = std::chrono::seconds(5); // where lines stay
 constexpr std::size_t BAR_WIDTH = 30;
+constexpr char CLEAR_LINE[] = "\r\033[K";
 
 struct Figures {
     std::uint64_t files;
@@ -44,22 +49,46 @@ struct Progress {
     std::optional<Figures> moved;
 };
 
-std::optional<Figures> read_figures(const std::string &path)
+struct Published {
+    std::string text;
+    std::int64_t written; // nanoseconds
+};
+
+// A file of a run; others may have put something else in its place.
+std::optional<Published> read_published(const std::string &path)
 {
-    std::ifstream file(path);
+    const UniqueFd file = open_own_file(path, O_RDONLY);
+    struct stat status = {};
+    char text[4096] = "";
+    if (!file || fstat(file.get(), &status) != 0) return std::nullopt;
+    const ssize_t length = read(file.get(), text, sizeof text);
+    if (length < 0) return std::nullopt;
+    return Published{{text, static_cast<std::size_t>(length)},
+                     std::int64_t{status.st_mtim.tv_sec} * 1'000'000'000 + status.st_mtim.tv_nsec};
+}
+
+std::optional<Figures> figures_in(const Published &published)
+{
+    std::istringstream text(published.text);
     Figures figures{};
-    if (file >> figures.files >> figures.bytes) return figures;
+    if (text >> figures.files >> figures.bytes) return figures;
     return std::nullopt;
 }
 
+// Figures that are older than the folder, or than the size that its dry run found, are an earlier transfer's.
 Progress read_progress(const std::string &name)
 {
     Progress progress;
-    std::ifstream file(progress_file(name));
-    std::getline(file, progress.folder);
-    std::getline(file, progress.place);
-    progress.total = read_figures(transfer_size_file(name));
-    progress.moved = read_figures(transfer_file(name));
+    const auto folder = read_published(progress_file(name));
+    if (!folder) return progress;
+    std::istringstream lines(folder->text);
+    std::getline(lines, progress.folder);
+    std::getline(lines, progress.place);
+    const auto total = read_published(transfer_size_file(name));
+    if (!total || total->written < folder->written) return progress;
+    progress.total = figures_in(*total);
+    const auto moved = read_published(transfer_file(name));
+    if (moved && moved->written >= total->written) progress.moved = figures_in(*moved);
     return progress;
 }
 
@@ -100,12 +129,18 @@ Json json_of(const Progress &progress)
 class Teller
 {
 public:
-    explicit Teller(bool json) : json_(json), terminal_(!json && isatty(STDOUT_FILENO) == 1) {}
+    explicit Teller(bool json) : json_(json), terminal_(!json && isatty(STDOUT_FILENO) == 1)
+    {
+        if (terminal_)
+            on_signal_.emplace([] {
+                if (write(STDOUT_FILENO, CLEAR_LINE, sizeof CLEAR_LINE - 1) < 0) return;
+            });
+    }
     Teller(const Teller &) = delete;
     Teller &operator=(const Teller &) = delete;
     ~Teller()
     {
-        if (drawn_) std::fputs("\r\033[K", stdout);
+        if (terminal_) std::fputs(CLEAR_LINE, stdout);
     }
 
     void tell(const Progress &progress)
@@ -133,9 +168,8 @@ private:
         const auto filled = static_cast<std::size_t>(share.value_or(0)) * BAR_WIDTH / 100;
         const std::string bar = '[' + std::string(filled, '#') + std::string(BAR_WIDTH - filled, '.') + "] ";
         const std::string line = (share ? bar : "") + words_of(progress);
-        std::printf("\r\033[K%s", std::string(fitting(line, columns())).c_str());
+        std::printf("%s%s", CLEAR_LINE, std::string(fitting(line, columns())).c_str());
         std::fflush(stdout);
-        drawn_ = true;
     }
 
     static std::size_t columns()
@@ -148,7 +182,7 @@ private:
 
     bool json_;
     bool terminal_;
-    bool drawn_ = false;
+    std::optional<OnSignal> on_signal_;
     std::string step_;
     std::string line_;
     Clock::time_point next_;
@@ -164,27 +198,42 @@ bool wait_for_start(const std::string &name)
     return true;
 }
 
+// Follows the run to its end. Whether it was a restore, which has a state of its own.
+bool follow(const std::string &name, bool json)
+{
+    Teller teller(json);
+    bool restore = false;
+    Clock::time_point next_look{};
+    while (run_of(name) == Run::GOING_ON) {
+        teller.tell(read_progress(name));
+        if (Clock::now() >= next_look) {
+            restore = rsync_state_is_running(read_job(name).record.rstate) == 1;
+            next_look = Clock::now() + std::chrono::seconds(1);
+        }
+        std::this_thread::sleep_for(LOOK_EVERY);
+    }
+    return restore;
+}
+
 } // namespace
 
 int watch_job(const Request &request)
 {
     read_job(request.name);
     const bool ran = wait_for_start(request.name);
-    if (ran) {
-        Teller teller(request.json);
-        while (run_of(request.name) == Run::GOING_ON) {
-            teller.tell(read_progress(request.name));
-            std::this_thread::sleep_for(LOOK_EVERY);
-        }
-    }
-    const Summary summary = summary_of(read_job(request.name));
+    const bool restore = ran && follow(request.name, request.json);
+    const StoredJob job = read_job(request.name);
+    const Summary summary = summary_of(job);
     if (request.json) {
         print_json(json_of(summary), -1);
     } else {
         std::printf("%s: %s%s %s\n", printable(summary.name).c_str(),
-                    ran ? "" : "no run is going on; the last: ", summary.last.c_str(), summary.time.c_str());
+                    ran ? "" : "no run is going on; the last: ",
+                    (restore ? "restore " + summary.restore : summary.last).c_str(),
+                    (restore ? summary.restore_time : summary.time).c_str());
     }
-    return summary.outcome == Outcome::FAILED ? EXIT_TROUBLE : EXIT_FINE;
+    const Outcome outcome = restore ? words_of_state(job.record.rstate).outcome : summary.outcome;
+    return outcome == Outcome::FAILED ? EXIT_TROUBLE : EXIT_FINE;
 }
 
 } // namespace bakjob::ctl

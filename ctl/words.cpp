@@ -69,12 +69,14 @@ constexpr std::array LOGINS = {
     LoginRow{SSH_REFUSED,
              {"is refused", "The host is up, but no ssh server listens on port 22: start it there."}},
     LoginRow{SSH_DENIED,
-             {"is denied", "bakjobctl set NAME ssh_user=USER ssh_pwd=-; without a password, keys must do."}},
+             {"is denied",
+              "With use_ssh=yes, bakjobctl set NAME ssh_user=USER ssh_pwd=-; otherwise keys must do."}},
     LoginRow{SSH_TIMED_OUT, {"gets no answer", "Look at remote_ip and whether the host is on."}},
     LoginRow{std::nullopt,
              {"meets another host key than before",
-              "If the host was not set up anew, somebody may be in between: find out before the next run, "
-              "which drops the known key and takes this one."}},
+              "If the host was not set up anew, somebody may be in between: find out first. A run with "
+              "use_ssh=yes "
+              "takes the new key by itself; ssh-keygen -R HOST forgets the old one for the others."}},
 };
 
 } // namespace

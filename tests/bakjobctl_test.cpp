@@ -6,7 +6,6 @@
 #include <csignal>
 #include <filesystem>
 #include <sys/mount.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 namespace fs = std::filesystem;
@@ -135,13 +134,16 @@ TEST_F(Ctl, WhatIsNotAllowedIsNamedAndChangesNothing)
 TEST_F(Ctl, AChangeThatCannotBeKeptIsAFailure)
 {
     ASSERT_TRUE(says(add("daily"), 0, ""));
+    ASSERT_TRUE(says(ctl("schedule daily '0 3 * * *'"), 0, ""));
     const std::string before = read_file(STORE);
+    const std::string cron = read_file(CRON);
     ASSERT_EQ(mount("/etc/NAS_CFG", "/etc/NAS_CFG", "", MS_BIND, nullptr), 0);
     ASSERT_EQ(mount(nullptr, "/etc/NAS_CFG", "", MS_REMOUNT | MS_BIND | MS_RDONLY, nullptr), 0);
-    for (const char *command : {"set daily retry=1", "delete daily", "schedule daily '0 3 * * *'"}) {
+    for (const char *command :
+         {"set daily retry=1", "delete daily", "schedule daily '0 4 * * *'", "unschedule daily"}) {
         EXPECT_EQ(ctl(command).status, 3) << command;
+        EXPECT_EQ(read_file(CRON), cron) << command;
     }
-    EXPECT_EQ(read_file(CRON).find("daily"), std::string::npos);
     umount2("/etc/NAS_CFG", MNT_DETACH);
     EXPECT_EQ(read_file(STORE), before);
 
@@ -178,21 +180,16 @@ TEST_F(Ctl, AJobHasOneTimetableAndKeepsItToItself)
     EXPECT_EQ(read_file(CRON), of_others);
     ASSERT_TRUE(says(ctl("set s schedule_mode=once"), 0, ""));
     EXPECT_EQ(read_file(CRON), of_others);
+    ASSERT_TRUE(says(add("it"), 0, ""));
     ASSERT_TRUE(says(ctl("delete ss"), 0, ""));
     ASSERT_TRUE(says(ctl("delete \"it's 100%\""), 0, ""));
     EXPECT_EQ(read_file(CRON), "");
-    EXPECT_EQ(ctl("list --names").output, "s\n");
+    EXPECT_EQ(ctl("list --names").output, "s\nit\n");
 }
 
 TEST_F(Ctl, ACheckFindsWhatARunWouldMeetHere)
 {
     ASSERT_TRUE(says(add("daily"), 0, ""));
-    const std::string gone = std::to_string([] {
-        const pid_t child = fork();
-        if (child == 0) _exit(0);
-        waitpid(child, nullptr, 0);
-        return child;
-    }());
     struct Case {
         Keys keys;
         std::string setup; // for the shell
@@ -208,7 +205,11 @@ TEST_F(Ctl, ACheckFindsWhatARunWouldMeetHere)
         {{{"remote_path", std::string(1100, 'x')}}, "", 1, "problem  remote_path"},
         {{{"remote_path", "/backup"}}, "", 1, "remote_path: it begins with a slash"},
         {{{"port", "873 "}}, "", 0, "0 problems"},
-        {{{"rsync_user", ""}}, "", 1, "problem  rsync_user"},
+        {{{"rsync_user", ""}}, "", 0, "note     rsync_user"},
+        {{{"server_type", "1"}}, "", 0, "note     rsync_user: a run looks by it for missing folders"},
+        {{{"inc_enable", "1"}, {"inc_number", "0"}, {"backup_type", "2"}}, "", 0, "note     inc_number"},
+        {{{"local_path", "/mnt/HD/HD_a2/Public::"}}, "", 0, "0 problems"},
+        {{{"port", "8730"}}, "", 0, "note     port"},
         {{{"rsync_user", ""}, {"server_type", "1"}}, "", 0, "0 problems"},
         {{{"rsync_pwd_file", "/tmp/other"}}, "", 1, "problem  rsync_pwd_file"},
         {{{"ssh_pwd", "rootpw!"}}, "", 1, "problem  ssh_pwd: it is not kept in base64"},
@@ -221,10 +222,10 @@ TEST_F(Ctl, ACheckFindsWhatARunWouldMeetHere)
         {{{"schedule_mode", "2"}, {"state", "2"}}, "", 1, "the job runs once, and has run"},
         {{{"state", "3"}}, "", 0, "bakjob -a clears that"},
         {{{"inc_enable", "1"}}, "", 0, "only a job that pulls keeps snapshots"},
-        {{}, "echo " + gone + " >/var/run/bakjob_daily.pid", 1, "bakjob -k daily clears that"},
-        {{}, "echo $PPID >/var/run/bakjob_daily.pid", 0, "bakjobctl watch daily"},
+        {{}, "true & echo $! >/var/run/bakjob_daily.pid", 1, "rm /var/run/bakjob_daily.pid and bakjob -a"},
+        {{}, "echo $PPID >/var/run/bakjob_daily.pid", 1, "run: one died"}, // another process has the number
         {{}, "printf 'S\\n1' >/tmp/kv_serial.txt", 1, "line break"},
-        {{}, "mv /usr/sbin/ssh-keygen /usr/sbin/ssh-keygen.away", 1, "problem  /usr/sbin/ssh-keygen"},
+        {{}, "mv /usr/sbin/ssh-keygen /usr/sbin/ssh-keygen.away", 0, "note     /usr/sbin/ssh-keygen"},
     };
     for (const Case &c : cases) {
         SetUp();
@@ -265,7 +266,13 @@ TEST_F(Ctl, AProbeSaysInWordsWhatTheRemoteSideRefuses)
         {"ssh_pwd=- <<<guess", 1, "the ssh login by which a run makes it is denied"},
         {"use_ssh=yes ssh_pwd=- <<<guess", 1, "ssh login: is denied"},
         {"use_ssh=yes", 0, "ssh login: is let in"},
-        {path_mode, 0, "cannot be looked at"}, // root's keys are none
+        {path_mode, 1, "Public: does not have the folder"},
+        {"port=8730", 1, "port 8730: refuses the connection"},
+        {"use_ssh=yes ssh_user=bk ssh_pwd=- <<<bkpw && mkdir -p /remote/backup/S123_remote_backup/daily", 1,
+         "Public: "}, // that user's daemon has no such module
+        {"remote_path=backup/ && mkdir -p /remote/backup/S123_remote_backup/daily/Public", 0,
+         "lets the job in"},
+        {path_mode + "&& mkdir -p /remote/data/S123_remote_backup/daily", 0, "Public: lets the job in"},
         {"remote_ip=no.such.host.invalid", 1, "problem  rsync daemon"},
         {"use_ssh=yes remote_ip=no.such.host.invalid", 1, "ssh login: fails"},
     };
@@ -284,7 +291,11 @@ TEST_F(Ctl, AProbeSaysInWordsWhatTheRemoteSideRefuses)
     const std::string known = read_file("/root/.ssh/known_hosts");
     EXPECT_TRUE(says(ctl("check daily --probe"), 1, "meets another host key than before"));
     EXPECT_EQ(read_file("/root/.ssh/known_hosts"), known) << "to be judged by a person";
-    EXPECT_EQ(shell("ls /tmp | grep -c passwd").output, "0\n");
+
+    const Fake silent("/usr/sbin/rsync", "sleep 9");
+    ASSERT_TRUE(says(ctl("set daily use_ssh=no"), 0, ""));
+    shell("timeout --signal=INT 1 /usr/sbin/bakjobctl check daily --probe");
+    EXPECT_EQ(shell("ls /tmp | grep -c passwd").output, "0\n") << "not even of a check that was interrupted";
 }
 
 TEST_F(Ctl, TheStatusIsWhatAMonitoringSystemNeeds)
@@ -294,7 +305,8 @@ TEST_F(Ctl, TheStatusIsWhatAMonitoringSystemNeeds)
     add_job({{"job_name", "off"}, {"state", "4"}, {"enable", "0"}});
     EXPECT_EQ(ctl("status").status, 0);
     add_job({{"job_name", "busy"}, {"state", "3"}});
-    write_file("/var/run/bakjob_busy.pid", std::to_string(getpid()) + "\n");
+    shell("bash -c 'exec -a bakjob bash -c \"sleep 20; :\" -r busy' >/dev/null 2>&1 & "
+          "echo $! >/var/run/bakjob_busy.pid");
     EXPECT_EQ(ctl("status").status, 2);
     EXPECT_EQ(ctl("status done").status, 0);
     for (const char *state : {"4", "8", "9", "11", "3", "77"}) {
@@ -305,7 +317,10 @@ TEST_F(Ctl, TheStatusIsWhatAMonitoringSystemNeeds)
     EXPECT_EQ(ctl("status").status, 1);
     EXPECT_TRUE(says(ctl("list --json"), 0, "\"last\": \"killed\""));
     EXPECT_TRUE(says(ctl("delete busy"), 3, "bakjob -k busy ends it"));
+    shell("kill $(cat /var/run/bakjob_busy.pid)");
+    EXPECT_EQ(ctl("status busy").status, 1);
     EXPECT_EQ(ctl("status nobody").status, 3);
+    EXPECT_EQ(ctl("status ''").status, 3);
     write_file(STORE, "<config><backup_mgr>");
     EXPECT_EQ(ctl("status").status, 3) << "a damaged configuration is not fine";
 }
@@ -326,9 +341,11 @@ TEST_F(Ctl, ARunIsFollowedToItsEnd)
     shell("rm -r /remote/backup/S123*");
     const Ran drawn =
         shell("/usr/sbin/bakjob -r daily & script -qec '/usr/sbin/bakjobctl watch daily' /dev/null; wait");
-    EXPECT_TRUE(says(drawn, 0, "[####"));
-    shell("/usr/sbin/bakjobctl set daily remote_path=nowhere");
-    EXPECT_TRUE(says(shell("/usr/sbin/bakjob -r daily; /usr/sbin/bakjobctl watch daily"), 1, "failed"));
+    EXPECT_TRUE(says(drawn, 0, ".] folder 1/1  /mnt/HD/HD_a2/Public    0 %"));
+    shell("rm -r /remote/backup/S123*/daily/Public");
+    const Ran restore = shell("/usr/sbin/bakjob -i /mnt -r daily & /usr/sbin/bakjobctl watch daily; "
+                              "status=$?; wait; exit $status");
+    EXPECT_TRUE(says(restore, 1, "daily: restore failed"));
 }
 
 TEST_F(Ctl, SnapshotsAreNumberedAsARecoverRunTakesThem)

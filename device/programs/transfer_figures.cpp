@@ -84,6 +84,7 @@ private:
 // The figures are what stands in the output that a job's "-q" would suppress.
 void make_talk(std::vector<std::string> &arguments, bool dry_run)
 {
+    std::erase(arguments, "-q");
     for (std::string &argument : arguments) {
         const bool letters = argument.size() > 1 && argument[0] == '-' && argument[1] != '-';
         const std::size_t q = letters ? argument.find('q') : std::string::npos;
@@ -130,12 +131,19 @@ int run_with_figures(const std::string &job_name, std::vector<std::string> argum
     if (child == 0) become_stock(arguments, ends[1]);
     close(ends[1]);
 
-    const FiguresFile file("/tmp/r_" + job_name + (dry_run ? ".dump_size" : ""));
+    const std::string path = "/tmp/r_" + job_name;
     Figures figures;
-    const auto take = dry_run ? take_statistics : take_progress;
-    read_lines(
-        ends[0], [&](std::string_view line) { take(line, figures); }, [&] { file.write(figures); });
-    file.write(figures);
+    if (dry_run) {
+        read_lines(
+            ends[0], [&](std::string_view line) { take_statistics(line, figures); }, [] {});
+        FiguresFile(path + ".dump_size").write(figures);
+    } else {
+        const FiguresFile file(path);
+        const auto publish = [&] { file.write(figures); };
+        read_lines(
+            ends[0], [&](std::string_view line) { take_progress(line, figures); }, publish);
+        publish();
+    }
 
     int status = 0;
     if (waitpid(child, &status, 0) != child) return EXIT_FAILURE;

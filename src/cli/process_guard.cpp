@@ -10,8 +10,8 @@
 
 #include <cerrno>
 #include <charconv>
-#include <csignal>
 #include <fcntl.h>
+#include <fstream>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -33,6 +33,20 @@ pid_t process_id_in(const std::string &path)
     const auto [end, error] = std::from_chars(content.data(), content.data() + content.size(), pid);
     const bool whole = error == std::errc() && (*end == '\0' || std::string_view(end) == "\n");
     return whole && pid > 0 ? pid : 0;
+}
+
+// By its command line: "bakjob", perhaps with a path or behind an emulator, and the name, perhaps joined to
+// its option.
+bool runs_job(pid_t pid, std::string_view job_name)
+{
+    std::ifstream file(format_text("/proc/%d/cmdline", pid), std::ios::binary);
+    bool is_bakjob = false;
+    bool is_named = false;
+    for (std::string word; std::getline(file, word, '\0');) {
+        is_bakjob |= std::string_view(word).substr(word.rfind('/') + 1) == "bakjob";
+        is_named |= word.ends_with(job_name);
+    }
+    return is_bakjob && is_named;
 }
 
 } // namespace
@@ -58,7 +72,7 @@ bool rsync_write_pid_file(const std::string &job_name)
 pid_t rsync_running_process(const std::string &job_name)
 {
     const pid_t pid = process_id_in(pid_file(job_name));
-    return pid > 0 && (kill(pid, 0) == 0 || errno == EPERM) ? pid : 0;
+    return pid > 0 && runs_job(pid, job_name) ? pid : 0;
 }
 
 int rsync_remove_pid_file(const std::string &job_name)

@@ -17,7 +17,8 @@ bool rsync_pid_file_absent(const std::string &job_name);
 // quicker.
 bool rsync_write_pid_file(const std::string &job_name);
 
-// The process that the job's pid file names, if one of that number lives; else 0.
+// The process that the job's pid file names, if it is one that runs the job; else 0, also for another process
+// that has got its number.
 pid_t rsync_running_process(const std::string &job_name);
 
 // 0 when the file was there and is gone, else -1.

@@ -109,13 +109,11 @@ int delete_entries(const Goes &goes)
             ++entry;
         } else if (remaining == 1) {
             delete_group(group);
-            LIB_do_ctc();
             return entries;
         } else {
             delete_entry(entry, --remaining);
         }
     }
-    if (remaining != entries) LIB_do_ctc();
     return entries - remaining;
 }
 
@@ -139,7 +137,8 @@ int rsync_schedule_names_job(std::string_view command)
 
 void rsync_prune_schedule()
 {
-    delete_entries([](const std::string &command) { return !is_kept(command); });
+    const int deleted = delete_entries([](const std::string &command) { return !is_kept(command); });
+    if (deleted > 0) LIB_do_ctc();
 }
 
 std::vector<ScheduleEntry> rsync_job_schedule(std::string_view job_name)
@@ -192,6 +191,11 @@ int rsync_create_schedule(const char *minute, const char *hour, const char *day,
     const int created = LIB_create_xml(minute, hour, day, month, weekday, user, run, GROUP);
     const int taken_over = LIB_do_ctc();
     return created >= 0 && taken_over >= 0 ? 1 : 0;
+}
+
+int rsync_apply_schedule()
+{
+    return LIB_do_ctc() >= 0 ? 1 : 0;
 }
 
 void rsync_delete_schedule()

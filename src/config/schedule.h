@@ -19,7 +19,8 @@ struct ScheduleEntry {
 // with a longer name.
 std::vector<ScheduleEntry> rsync_job_schedule(std::string_view job_name);
 
-// Deletes them; how many there were. Does not write the configuration file.
+// Deletes them; how many there were. The configuration file is the caller's to write, and then the scheduler's
+// to take over by rsync_apply_schedule.
 int rsync_unschedule_job(std::string_view job_name);
 
 // Deletes the entries that name no job of the job list; the last one left takes the group with it. Does not
@@ -35,6 +36,9 @@ void rsync_remove_job_schedule(const char *job_name);
 // Adds an entry and has the scheduler take it over. 1 when both did so, else 0.
 int rsync_create_schedule(const char *minute, const char *hour, const char *day, const char *month,
                           const char *weekday, const char *user, const char *run);
+
+// Has the scheduler take over what the configuration says. 1 when it did, else 0.
+int rsync_apply_schedule();
 
 // Deletes all entries for backup jobs.
 void rsync_delete_schedule();

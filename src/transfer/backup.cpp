@@ -77,17 +77,6 @@ std::string dry_run_of(const std::string &command)
     return with_dump_size(command) + " --dry-run >/dev/null 2>&1";
 }
 
-// The whole command of the transfer; nothing when it is refused, or its dry run would not fit.
-std::optional<std::string> transfer_command(const RsyncJob &job)
-{
-    auto command = rsync_build_command(job);
-    if (command && !fits_command(dry_run_of(*command))) {
-        DebugLog("ERROR: transfer command refused: too long\n");
-        command.reset();
-    }
-    return command;
-}
-
 // Up to `retry` passes, at least one, each a dry run and, if that went well, the transfer. The exit code of
 // the last command.
 int transfer_with_retries(const std::string &job_name, const RsyncJob &job, const std::string &command)
@@ -109,6 +98,16 @@ int transfer_with_retries(const std::string &job_name, const RsyncJob &job, cons
 }
 
 } // namespace
+
+std::optional<std::string> rsync_transfer_command(const RsyncJob &job)
+{
+    auto command = rsync_build_command(job);
+    if (command && !fits_command(dry_run_of(*command))) {
+        DebugLog("ERROR: transfer command refused: too long\n");
+        command.reset();
+    }
+    return command;
+}
 
 bool rsync_write_password_file()
 {
@@ -152,7 +151,7 @@ BackupResult rsync_run_backup(const std::string &job_name, RsyncJob &job)
     if (!rsync_write_password_file() && job.rsync_mode == RSYNC_MODE_DAEMON) return BACKUP_FAILED;
     if (const auto failure = check_remote_side(job_name, job)) return *failure;
 
-    const auto command = transfer_command(job);
+    const auto command = rsync_transfer_command(job);
     if (!command) return BACKUP_FAILED;
     unlink(transfer_file(job_name).c_str());
     if (keeps_snapshots(job)) {

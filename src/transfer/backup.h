@@ -4,6 +4,7 @@
 
 #include "config/job.h"
 
+#include <optional>
 #include <string>
 
 namespace bakjob
@@ -21,6 +22,9 @@ enum BackupResult : int {
 // `rsync_pwd_file` is changed. Blocks for as long as the probes, the transfers and the waits between them
 // take.
 BackupResult rsync_run_backup(const std::string &job_name, RsyncJob &job);
+
+// The command of the transfer (rsync_command.h); also nothing when its dry run would not fit.
+std::optional<std::string> rsync_transfer_command(const RsyncJob &job);
 
 // Writes the password file of CurrentJob: one line, readable by the owner alone. False, with a trace, when
 // the password has no such form or the file cannot be made.
