@@ -196,6 +196,7 @@ TEST_F(RecoverListing, NumbersTheSnapshotsInNameOrder)
     EXPECT_EQ(recover_list.count, 0);
     for (const char *name : {"job.x", "job.2", "job.0", "job.1", "jobs.0", "backup.0", ".job.0"})
         fs::create_directories(folder + "/" + name);
+    shell("touch -d '2040-05-06 07:08:09' " + folder + "/job.1"); // beyond what 32 bits can tell
     run_options.debug_mode = 1;
     testing::internal::CaptureStdout();
     EXPECT_EQ(rsync_list_snapshots("job"), 1);
@@ -208,6 +209,7 @@ TEST_F(RecoverListing, NumbersTheSnapshotsInNameOrder)
                                                           recover_list.entries[i].time + ": " +
                                                           recover_list.entries[i].path + "]");
     }
+    EXPECT_STREQ(recover_list.entries[1].time, "2040-05-06 07:08:09");
     for (int i = 3; i < 12; ++i)
         fs::create_directories(folder + "/job." + std::to_string(i));
     rsync_list_snapshots("job");

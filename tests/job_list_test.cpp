@@ -25,9 +25,8 @@ std::string names()
 
 TEST_F(JobList, KeepsOrderAndTail)
 {
-    for (const char *name : {"a", "b", "a", "c"}) {
-        EXPECT_EQ(rsync_list_add_job(make_job(name)),
-                  std::string(name) == "a" && job_list->count > 0 ? 0 : 1);
+    for (const auto &[name, added] : {std::pair("a", 1), {"b", 1}, {"a", 0}, {"c", 1}}) {
+        EXPECT_EQ(rsync_list_add_job(make_job(name)), added) << name;
     }
     EXPECT_EQ(names(), "a b c ");
     EXPECT_EQ(rsync_find_job("B"), nullptr);

@@ -1,5 +1,6 @@
 #include "atomic_file.h"
 
+#include <array>
 #include <cerrno>
 #include <charconv>
 #include <csignal>
@@ -92,20 +93,13 @@ UniqueFd replace_file(const std::string &path, std::string_view contents, mode_t
 bool read_whole(int fd, std::string &contents)
 {
     contents.clear();
-    struct stat status = {};
-    if (fstat(fd, &status) < 0) return false;
-    std::size_t used = 0;
-    contents.resize(static_cast<std::size_t>(status.st_size) + 1);
+    std::array<char, 65536> piece{};
     for (;;) {
-        if (used == contents.size()) contents.resize(2 * used);
-        const ssize_t count = read(fd, contents.data() + used, contents.size() - used);
+        const ssize_t count = read(fd, piece.data(), piece.size());
         if (count < 0 && errno == EINTR) continue;
-        if (count < 0) return false;
-        if (count == 0) break;
-        used += static_cast<std::size_t>(count);
+        if (count <= 0) return count == 0;
+        contents.append(piece.data(), static_cast<std::size_t>(count));
     }
-    contents.resize(used);
-    return true;
 }
 
 } // namespace device

@@ -36,7 +36,7 @@ std::vector<Bytes> &table()
     return the_table;
 }
 
-// No pointer in the table is aligned.
+// RECORD_NEXT is not aligned for pointers of 8 bytes.
 void put_pointer(Bytes &bytes, std::size_t offset, const char *pointer)
 {
     std::memcpy(bytes.data() + offset, &pointer, sizeof pointer);

@@ -20,7 +20,7 @@ namespace
 {
 
 constexpr int REFUSED = 255;
-constexpr long HIGHEST_SEQ = 10;
+constexpr long long HIGHEST_SEQ = 10;
 
 // What the options of one command line share.
 struct OptionLoop {
@@ -67,7 +67,7 @@ Ending restore(OptionLoop & /*loop*/, const char * /*argument*/)
 
 Ending recover(OptionLoop & /*loop*/, const char *argument)
 {
-    const long seq = std::strtol(argument, nullptr, 10);
+    const long long seq = std::strtoll(argument, nullptr, 10);
     if (seq == 0 || seq > HIGHEST_SEQ || seq < INT32_MIN) {
         DebugLog("ERROR: input error!\n");
         return REFUSED;

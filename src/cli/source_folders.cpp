@@ -23,7 +23,8 @@ char share_subdir[PATH_SIZE];
 namespace
 {
 
-// Byte offsets that the share library promises. Records are not aligned for pointers.
+// Byte offsets that the share library promises, whatever the width of a pointer: the next record's is not
+// aligned for one of 8 bytes.
 constexpr std::size_t FIRST_SHARE = 49016;
 constexpr std::size_t SHARE_NAME = 516;
 constexpr std::size_t SHARE_PATH = 2052;

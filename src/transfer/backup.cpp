@@ -134,7 +134,7 @@ bool rsync_write_password_file()
 
 int select_sleep(int seconds, int milliseconds)
 {
-    timeval time{.tv_sec = seconds, .tv_usec = milliseconds * 1000L};
+    timeval time{.tv_sec = seconds, .tv_usec = suseconds_t{1000} * milliseconds};
     return select(0, nullptr, nullptr, nullptr, &time);
 }
 
