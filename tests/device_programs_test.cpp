@@ -88,12 +88,13 @@ TEST_F(Programs, NoProcessShowsTheLoginPassword)
 TEST_F(Programs, ATransferShowsItsJobInEveryProcess)
 {
     write_file("/tmp/from/file", std::string(1'000'000, 'x'));
-    shell("rsync --job-name='my job' --dump-size --bwlimit=10 /tmp/from/file /tmp/to >/dev/null 2>&1 &");
+    shell("/usr/sbin/rsync --job-name='my job' --dump-size --bwlimit=10 /tmp/from/file /tmp/to >/dev/null "
+          "2>&1 &");
     std::string processes;
     const std::vector<std::string> parts = {"/usr/sbin/rsync", "job-name=my job", "--bwlimit=10"};
     EXPECT_TRUE(eventually([&] {
         processes = shell("ps -ww").output;
-        return count_lines(processes, parts) == 3;
+        return count_lines(processes, parts) == 4;
     })) << processes;
     for (const std::string &line : lines_of(processes)) {
         if (line.find("job-name=my job") != std::string::npos)
