@@ -160,13 +160,15 @@ TEST_F(RemoteSide, AChangedHostKeyIsRepaired)
 TEST_F(RemoteSide, KillEndsARunAndItsTransfersButNoOther)
 {
     const std::string killed = "it's $x (1)";
+    constexpr std::size_t BIG = 2'000'000; // bytes; slowed down below, still on its way when the kill comes
     for (const std::string &name : {killed, std::string("other")}) {
         add_job({{"job_name", name},
 
                  {"ssh_pwd", SSH_PASSWORD},
                  {"keep_exist_file", "2"}, // a restore of one folder would delete the other
                  {"local_path", SHARE + std::string("/") + name}});
-        write_file(SHARE + std::string("/") + name + "/big", std::string(400'000, 'x'));
+        write_file(SHARE + std::string("/") + name + "/big",
+                   std::string(name == killed ? BIG : BIG / 5, 'x'));
     }
     const auto start = [](const std::string &arguments) {
         shell("/usr/sbin/bakjob " + arguments + " >/dev/null 2>&1 &");
@@ -179,7 +181,7 @@ TEST_F(RemoteSide, KillEndsARunAndItsTransfersButNoOther)
     start("-r \"it's \\$x (1)\""); // so that there is something to restore
     ASSERT_TRUE(eventually([&] { return job_key(1, "state") == "2"; }));
     for (const bool restore : {false, true}) {
-        write_file(SHARE + std::string("/") + killed + "/big", std::string(400'000, restore ? 'y' : 'z'));
+        write_file(SHARE + std::string("/") + killed + "/big", std::string(BIG, restore ? 'y' : 'z'));
         const Fake slow(
             "/usr/sbin/rsync",
             "case \"$*\" in --server*|*--dry-run*|*::) ;; *) set -- --bwlimit=100 \"$@\" ;; esac\n"
