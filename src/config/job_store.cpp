@@ -27,18 +27,16 @@ constexpr std::size_t LONGEST_TEXT = 1U << 20U; // bytes that a save brings back
 class ItemPath
 {
 public:
-    explicit ItemPath(int item)
-        : length_(static_cast<std::size_t>(std::snprintf(path_, sizeof path_, "%s/item:%d/", JOBS, item)))
-    {
-    }
+    explicit ItemPath(int item) : path_(format_text("%s/item:%d/", JOBS, item)), length_(path_.size()) {}
     const char *key(const char *name)
     {
-        std::snprintf(path_ + length_, sizeof path_ - length_, "%s", name);
-        return path_;
+        path_.resize(length_);
+        path_ += name;
+        return path_.c_str();
     }
 
 private:
-    char path_[128];
+    std::string path_;
     std::size_t length_;
 };
 
@@ -80,7 +78,8 @@ bool load_job(RsyncJob &job, int item)
             found |= value != -1;
         } else {
             // One byte more than the field holds tells a full text from a cut one.
-            char text[sizeof job.local_path + 1] = "";
+            char text[sizeof job.local_path + 1];
+            text[0] = '\0';
             xml_get_str(key, static_cast<int>(field.size + 1), text);
             const std::size_t length = std::strlen(text);
             if (length == field.size) job.cut_fields |= bit;
