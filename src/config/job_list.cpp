@@ -3,6 +3,7 @@
 #include "common/text.h"
 
 #include <new>
+#include <utility>
 
 namespace bakjob
 {
@@ -54,12 +55,17 @@ RsyncJob *rsync_new_job()
 int rsync_list_add_job(const RsyncJob &source)
 {
     if (rsync_find_job(source.job_name) != nullptr) return 0;
-    RsyncJob *const job = rsync_new_job();
-    if (job == nullptr) return 0;
-    job_list->append(job);
+    std::unique_ptr<RsyncJob> job(rsync_new_job());
+    if (!job) return 0;
     rsync_copy_job(*job, source);
-    apply_defaults(*job);
+    rsync_list_take_job(std::move(job));
     return 1;
+}
+
+void rsync_list_take_job(std::unique_ptr<RsyncJob> job)
+{
+    apply_defaults(*job);
+    job_list->append(job.release());
 }
 
 RsyncJob *rsync_find_job(std::string_view job_name)

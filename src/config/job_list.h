@@ -7,6 +7,7 @@
 #include "config/job.h"
 #include "config/record_list.h"
 
+#include <memory>
 #include <string_view>
 
 namespace bakjob
@@ -26,6 +27,9 @@ RsyncJob *rsync_new_job();
 // "873", and plain passwords (`pwd_encoded` 0) are brought into base64. Passwords too long for that stay
 // plain, both of them. 0 when the name is already in the list or memory is short, else 1.
 int rsync_list_add_job(const RsyncJob &source);
+
+// The same with the record itself, for a caller who knows that its name is new.
+void rsync_list_take_job(std::unique_ptr<RsyncJob> job);
 
 // The record of that name, byte for byte, or null. Valid until the list is emptied.
 RsyncJob *rsync_find_job(std::string_view job_name);

@@ -11,6 +11,9 @@
 #include <cstdio>
 #include <cstring>
 #include <map>
+#include <memory>
+#include <string_view>
+#include <unordered_set>
 #include <utility>
 
 namespace bakjob
@@ -118,14 +121,18 @@ void rsync_load_jobs()
 {
     rsync_free_jobs();
     uncut_texts.clear();
+    std::unordered_set<std::string_view> names; // of the listed records
     const int count = xml_get_int(JOB_COUNT);
     for (int item = 1; item <= count; ++item) {
-        RsyncJob job{};
-        const bool found = load_job(job, item);
-        const bool added = rsync_list_add_job(job) == 1;
-        if (added && job.cut_fields != 0) keep_uncut_texts(job, item);
+        std::unique_ptr<RsyncJob> job(rsync_new_job());
+        if (!job) break;
+        const bool found = load_job(*job, item);
+        const bool is_new = names.insert(job->job_name).second;
         // Behind an item that is not there is none, whatever the count says.
-        if (!found && !added) break;
+        if (!found && !is_new) break;
+        if (!is_new) continue;
+        if (job->cut_fields != 0) keep_uncut_texts(*job, item);
+        rsync_list_take_job(std::move(job));
     }
 }
 
