@@ -72,6 +72,13 @@ struct Store {
     FileVersion complained_about;
     pugi::xml_document document;
     ListCursors cursors;
+    RecordCursor record;
+
+    void forget_nodes()
+    {
+        cursors.forget();
+        record.forget();
+    }
 };
 
 Store &store()
@@ -118,7 +125,7 @@ const char *load()
 void read_file()
 {
     Store &s = store();
-    s.cursors.forget();
+    s.forget_nodes();
     s.document.reset();
     s.unsaved = false;
     const char *const why = load();
@@ -157,28 +164,45 @@ xml_node resolve(const StorePath &path, bool create)
     if (path.depth == 0 || s.state != Store::State::GOOD) return {};
     xml_node node = s.document.document_element();
     if (!node && create) node = s.document.append_child(ROOT_NAME);
-    bool in_record = false;
+    xml_node parent;
     for (const Step &step : path.used()) {
-        xml_node child;
+        parent = node;
         if (step.index > 0) {
-            child = s.cursors.numbered_child(node, step.name, step.index, create);
+            node = s.cursors.numbered_child(parent, step.name, step.index, create);
         } else {
-            child = in_record ? s.cursors.record_key(node, step.name) : plain_child(node, step.name);
-            if (!child && create) child = node.append_child(std::string(step.name).c_str());
+            node = plain_child(parent, step.name);
+            if (!node && create) node = parent.append_child(std::string(step.name).c_str());
         }
-        if (!child) return {};
-        node = child;
-        in_record = step.index > 0;
+        if (!node) break;
     }
+    const std::string_view record = path.record();
+    if (node && !record.empty()) s.record.enter(record, parent);
     return node;
+}
+
+// The last step of a path to a key of the record that was looked up last; null for other paths.
+const char *key_of_latest_record(const char *path)
+{
+    const Store &s = store();
+    const char *const slash = std::strrchr(path, '/');
+    if (s.state != Store::State::GOOD || !slash || !s.record.is_at({path, slash})) return nullptr;
+    return is_node_name(slash + 1) ? slash + 1 : nullptr;
 }
 
 xml_node find(const char *path_text)
 {
     if (!path_text) return {};
+    if (const char *const key = key_of_latest_record(path_text)) return store().record.key(key, false);
     const StorePath path = parse_store_path(path_text);
     if (!path.numbered() || store().state != Store::State::GOOD) look_at_file();
     return resolve(path, false);
+}
+
+xml_node find_or_make(const char *path_text)
+{
+    look_at_file();
+    if (const char *const key = key_of_latest_record(path_text)) return store().record.key(key, true);
+    return resolve(parse_store_path(path_text), true);
 }
 
 struct StringWriter : pugi::xml_writer {
@@ -246,8 +270,7 @@ int xml_get_int(const char *path)
 int xml_set_str(const char *path, const char *text)
 {
     if (!path || !text) return -1;
-    look_at_file();
-    const xml_node node = resolve(parse_store_path(path), true);
+    const xml_node node = find_or_make(path);
     if (!node) return -1;
     store().unsaved = true;
     return node.text().set(text) ? 0 : -1;
@@ -264,7 +287,7 @@ int xml_del(const char *path)
     look_at_file();
     const xml_node node = resolve(parse_store_path(path), false);
     if (!node || !node.parent().remove_child(node)) return -1;
-    store().cursors.forget();
+    store().forget_nodes();
     store().unsaved = true;
     return 0;
 }

@@ -36,6 +36,15 @@ xml_node first_named(xml_node parent, std::string_view name)
     return !first || is_named(first, name) ? first : next_named(first, name);
 }
 
+// The first element from there on that is named like `node`, which may be an instruction of that name.
+xml_node element_from(xml_node node)
+{
+    while (node && node.type() != pugi::node_element) {
+        node = node.next_sibling(node.name());
+    }
+    return node;
+}
+
 } // namespace
 
 // A list that has no cursor gets the one that was used longest ago.
@@ -46,7 +55,7 @@ ListCursors::Cursor &ListCursors::cursor_of(xml_node parent, std::string_view na
         if (cursor.parent == parent && cursor.name == name) return cursor;
         if (cursor.used < oldest->used) oldest = &cursor;
     }
-    *oldest = {parent, std::string(name), 0, {}, {}, 0};
+    *oldest = {parent, std::string(name), 0, {}, 0};
     return *oldest;
 }
 
@@ -71,23 +80,23 @@ xml_node ListCursors::numbered_child(xml_node parent, std::string_view name, int
     if (node && node != cursor.node) {
         cursor.node = node;
         cursor.index = index;
-        cursor.key = {};
     }
     return node;
 }
 
-xml_node ListCursors::record_key(xml_node record, std::string_view name)
+void RecordCursor::enter(std::string_view path, xml_node record)
 {
-    const auto is_its_cursor = [&](const Cursor &cursor) { return cursor.node == record; };
-    const auto cursor = std::find_if(cursors_.begin(), cursors_.end(), is_its_cursor);
-    if (cursor == cursors_.end() || !cursor->key) {
-        const xml_node found = first_named(record, name);
-        if (found && cursor != cursors_.end()) cursor->key = found;
-        return found;
-    }
-    xml_node found = is_named(cursor->key, name) ? cursor->key : next_named(cursor->key, name);
-    if (!found) found = first_named(record, name);
-    if (found) cursor->key = found;
+    path_ = path;
+    record_ = record;
+    key_ = {};
+}
+
+xml_node RecordCursor::key(const char *name, bool create)
+{
+    xml_node found = is_named(key_, name) ? key_ : element_from(key_.next_sibling(name));
+    if (!found) found = element_from(record_.child(name));
+    if (!found && create) found = record_.append_child(name);
+    if (found) key_ = found;
     return found;
 }
 

@@ -8,19 +8,6 @@ namespace device
 namespace
 {
 
-// What may stand in an element's name. Anything else would make the file unreadable.
-bool is_node_name(std::string_view name)
-{
-    const auto is_start = [](unsigned char c) {
-        return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || c == '_' || c >= 0x80;
-    };
-    const auto is_inner = [&](unsigned char c) {
-        return is_start(c) || (c >= '0' && c <= '9') || c == '-' || c == '.';
-    };
-    return !name.empty() && is_start(static_cast<unsigned char>(name.front())) &&
-           std::all_of(name.begin(), name.end(), is_inner);
-}
-
 bool parse_step(std::string_view text, Step &step)
 {
     const std::size_t colon = text.find(':');
@@ -35,9 +22,29 @@ bool parse_step(std::string_view text, Step &step)
 
 } // namespace
 
+bool is_node_name(std::string_view name)
+{
+    const auto is_start = [](unsigned char c) {
+        return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || c == '_' || c >= 0x80;
+    };
+    const auto is_inner = [&](unsigned char c) {
+        return is_start(c) || (c >= '0' && c <= '9') || c == '-' || c == '.';
+    };
+    return !name.empty() && is_start(static_cast<unsigned char>(name.front())) &&
+           std::all_of(name.begin(), name.end(), is_inner);
+}
+
 bool StorePath::numbered() const
 {
     return std::any_of(steps.begin(), steps.begin() + depth, [](const Step &step) { return step.index > 0; });
+}
+
+std::string_view StorePath::record() const
+{
+    if (depth < 2 || steps[depth - 1].index > 0 || steps[depth - 2].index == 0) return {};
+    const char *const begin = steps[0].name.data() - 1;
+    const char *const end = steps[depth - 1].name.data() - 1;
+    return {begin, end};
 }
 
 StorePath parse_store_path(std::string_view text)

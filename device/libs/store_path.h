@@ -24,7 +24,12 @@ struct StorePath {
 
     [[nodiscard]] std::span<const Step> used() const { return {steps.data(), depth}; }
     [[nodiscard]] bool numbered() const;
+    // Of "/list/item:2/key" the part before "/key"; empty when the path is not one of a numbered node's key.
+    [[nodiscard]] std::string_view record() const;
 };
+
+// What may stand in an element's name. Anything else would make the file unreadable.
+bool is_node_name(std::string_view name);
 
 // Never fails otherwise than by a depth of 0. The steps are views into `text`.
 StorePath parse_store_path(std::string_view text);
