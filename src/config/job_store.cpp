@@ -7,7 +7,6 @@
 #include "config/store_text.h"
 #include "platform/config_store.h"
 
-#include <algorithm>
 #include <cstdio>
 #include <cstring>
 #include <map>
@@ -80,13 +79,12 @@ bool load_job(RsyncJob &job, int item)
             integer_field(job, field) = in_range ? value : field.otherwise;
             found |= value != -1;
         } else {
-            // One byte more than the field holds tells a full text from a cut one.
-            char text[sizeof job.local_path + 1];
-            text[0] = '\0';
-            xml_get_str(key, static_cast<int>(field.size + 1), text);
+            char *const text = text_field(job, field);
+            xml_get_str(key, static_cast<int>(field.size), text);
             const std::size_t length = std::strlen(text);
-            if (length == field.size) job.cut_fields |= bit;
-            copy_text(text_field(job, field), field.size, {text, std::min(length, field.size - 1)});
+            // A text that fills its field may be the start of a longer one.
+            const bool full = length == field.size - 1;
+            if (full && store_text(key, field.size + 1).size() == field.size) job.cut_fields |= bit;
             found |= length > 0;
         }
         bit <<= 1;
