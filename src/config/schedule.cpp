@@ -6,6 +6,8 @@
 #include "config/store_text.h"
 #include "platform/scheduler.h"
 
+#include <unordered_set>
+
 namespace bakjob
 {
 
@@ -74,10 +76,28 @@ void delete_group(const Group &group)
     xml_del(GROUP_NODE);
 }
 
-// A command that is longer than what is read of it may have been cut before the name, so it is not judged.
-bool is_kept(const std::string &command)
+using Names = std::unordered_set<std::string_view>;
+
+Names listed_names()
 {
-    return command.size() == TEXT_SIZE || rsync_schedule_names_job(command) == 1;
+    Names names;
+    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+        names.insert(job->job_name);
+    }
+    return names;
+}
+
+// Whether one of the names stands in single quotes, of which it may have some itself. There are as many
+// entries as jobs, so a look at each name for each entry would be too many.
+bool names_one_of(const Names &names, std::string_view command)
+{
+    for (std::size_t open = command.find('\''); open < command.size(); open = command.find('\'', open + 1)) {
+        std::size_t close = command.find('\'', open + 1);
+        for (; close < command.size(); close = command.find('\'', close + 1)) {
+            if (names.contains(command.substr(open + 1, close - open - 1))) return true;
+        }
+    }
+    return false;
 }
 
 bool names(std::string_view command, std::string_view job_name)
@@ -129,15 +149,16 @@ int first_entry_holding(const char *job_name, int entries)
 
 int rsync_schedule_names_job(std::string_view command)
 {
-    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
-        if (names(command, job->job_name)) return 1;
-    }
-    return 0;
+    return names_one_of(listed_names(), command) ? 1 : 0;
 }
 
+// A command that is longer than what is read of it may have been cut before the name, so it is not judged.
 void rsync_prune_schedule()
 {
-    const int deleted = delete_entries([](const std::string &command) { return !is_kept(command); });
+    const Names listed = listed_names();
+    const int deleted = delete_entries([&](const std::string &command) {
+        return command.size() != TEXT_SIZE && !names_one_of(listed, command);
+    });
     if (deleted > 0) LIB_do_ctc();
 }
 
