@@ -38,6 +38,24 @@ TEST_F(Shell, CommandsSeeAFixedWorld)
     EXPECT_EQ(first_reply_line("cat; echo end"), "end") << "nothing on standard input";
 }
 
+// The program ignores broken pipes, and interrupts while it waits: a command must not inherit that, but what
+// the program itself was told to ignore.
+TEST_F(Shell, CommandsEndBySignalsAsTheCallerWould)
+{
+    const auto ended_by = [](int signal) {
+        return exit_code(run_shell("kill -" + std::to_string(signal) + " $$; exit 5")) - 128;
+    };
+    const auto at_pipe = std::signal(SIGPIPE, SIG_IGN);
+    for (const int signal : {SIGPIPE, SIGINT, SIGQUIT}) {
+        EXPECT_EQ(ended_by(signal), signal);
+    }
+    EXPECT_EQ(first_reply_line("kill -PIPE $$; echo lives"), "");
+    const auto at_interrupt = std::signal(SIGINT, SIG_IGN);
+    EXPECT_EQ(ended_by(SIGINT), 5 - 128);
+    EXPECT_EQ(std::signal(SIGINT, at_interrupt), SIG_IGN) << "as it was before the command";
+    std::signal(SIGPIPE, at_pipe);
+}
+
 TEST_F(Shell, OnlyTheFirstLineOfAReplyCounts)
 {
     EXPECT_EQ(first_reply_line("echo 'a b \t'; echo c"), "a b");

@@ -8,6 +8,7 @@
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
+#include <spawn.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -32,12 +33,19 @@ public:
     }
     IgnoreInterrupts(const IgnoreInterrupts &) = delete;
     IgnoreInterrupts &operator=(const IgnoreInterrupts &) = delete;
-    ~IgnoreInterrupts() { restore(); }
-
-    void restore() const
+    ~IgnoreInterrupts()
     {
         sigaction(SIGINT, &interrupt_, nullptr);
         sigaction(SIGQUIT, &quit_, nullptr);
+    }
+
+    // What the command is not to inherit from us.
+    [[nodiscard]] sigset_t not_ignored_before() const
+    {
+        sigset_t signals = {};
+        if (interrupt_.sa_handler != SIG_IGN) sigaddset(&signals, SIGINT);
+        if (quit_.sa_handler != SIG_IGN) sigaddset(&signals, SIGQUIT);
+        return signals;
     }
 
 private:
@@ -45,17 +53,32 @@ private:
     struct sigaction quit_ = {};
 };
 
-// In the child: never returns. `output` below 0 keeps the program's own standard output.
-[[noreturn]] void become_shell(const char *command, int output)
+// The shell's process, -1 when it cannot be started. `output` below 0 keeps the program's own standard
+// output; `signals` get their default action. Unlike fork, posix_spawn copies nothing of this process.
+pid_t start_shell(const std::string &command, int output, sigset_t signals)
 {
-    std::signal(SIGPIPE, SIG_DFL);
-    const int nothing = open("/dev/null", O_RDONLY | O_CLOEXEC);
-    if (nothing >= 0) dup2(nothing, STDIN_FILENO);
-    if (output >= 0) dup2(output, STDOUT_FILENO);
+    const char *const arguments[] = {"sh", "-f", "-c", command.c_str(), nullptr};
     const char *const environment[] = {"PATH=/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin",
                                        "LC_ALL=C", nullptr};
-    execle("/bin/sh", "sh", "-f", "-c", command, nullptr, environment);
-    _exit(127);
+    posix_spawn_file_actions_t handles;
+    posix_spawn_file_actions_init(&handles);
+    const UniqueFd nothing(open("/dev/null", O_RDONLY | O_CLOEXEC));
+    if (nothing) posix_spawn_file_actions_adddup2(&handles, nothing.get(), STDIN_FILENO);
+    if (output >= 0) posix_spawn_file_actions_adddup2(&handles, output, STDOUT_FILENO);
+
+    posix_spawnattr_t attributes;
+    posix_spawnattr_init(&attributes);
+    posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGDEF);
+    sigaddset(&signals, SIGPIPE);
+    posix_spawnattr_setsigdefault(&attributes, &signals);
+
+    pid_t child = -1;
+    const int failure =
+        posix_spawn(&child, "/bin/sh", &handles, &attributes, const_cast<char *const *>(arguments),
+                    const_cast<char *const *>(environment));
+    posix_spawnattr_destroy(&attributes);
+    posix_spawn_file_actions_destroy(&handles);
+    return failure == 0 ? child : -1;
 }
 
 int wait_for(pid_t child)
@@ -79,11 +102,7 @@ int run_shell(const std::string &command)
 {
     std::fflush(stdout);
     const IgnoreInterrupts ignore;
-    const pid_t child = fork();
-    if (child == 0) {
-        ignore.restore();
-        become_shell(command.c_str(), -1);
-    }
+    const pid_t child = start_shell(command, -1, ignore.not_ignored_before());
     return child < 0 ? -1 : wait_for(child);
 }
 
@@ -94,8 +113,7 @@ ShellReader::ShellReader(const std::string &command)
     if (pipe2(ends, O_CLOEXEC) != 0) return;
     UniqueFd reading(ends[0]);
     const UniqueFd writing(ends[1]);
-    child_ = fork();
-    if (child_ == 0) become_shell(command.c_str(), writing.get());
+    child_ = start_shell(command, writing.get(), {});
     if (child_ < 0) return;
     output_.reset(fdopen(reading.get(), "r"));
     if (output_) reading.release();
