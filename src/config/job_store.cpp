@@ -143,9 +143,8 @@ bool rsync_save_jobs()
         save_job(*job, ++item);
     }
     rsync_prune_schedule();
-    const bool written = xml_write_file(CONFIG_FILE) >= 0;
-    rsync_free_jobs();
-    return written;
+    rsync_free_jobs(); // before the write, which can use their memory
+    return xml_write_file(CONFIG_FILE) >= 0;
 }
 
 } // namespace bakjob
