@@ -19,8 +19,8 @@ struct ScheduleEntry {
 // with a longer name.
 std::vector<ScheduleEntry> rsync_job_schedule(std::string_view job_name);
 
-// Deletes them; how many there were. The configuration file is the caller's to write, and then the scheduler's
-// to take over by rsync_apply_schedule.
+// Deletes them; how many there were. The configuration file is the caller's to write, and then the
+// scheduler's to take over by rsync_apply_schedule.
 int rsync_unschedule_job(std::string_view job_name);
 
 // Deletes the entries that name no job of the job list; the last one left takes the group with it. Does not
