@@ -1,8 +1,9 @@
 #pragma once
 
-// What the commands print: tables for people, JSON for programs.
+// What the commands print: tables for people, JSON for programs. Whoever makes JSON includes
+// <nlohmann/json.hpp>.
 
-#include <nlohmann/json.hpp>
+#include <nlohmann/json_fwd.hpp>
 #include <string>
 #include <string_view>
 #include <vector>

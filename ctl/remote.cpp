@@ -11,6 +11,7 @@
 #include "remote/sizes.h"
 
 #include <cstdio>
+#include <nlohmann/json.hpp>
 
 namespace bakjob::ctl
 {

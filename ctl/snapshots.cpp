@@ -9,6 +9,7 @@
 
 #include <cstdio>
 #include <cstring>
+#include <nlohmann/json.hpp>
 #include <optional>
 
 namespace bakjob::ctl

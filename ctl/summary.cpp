@@ -5,6 +5,8 @@
 #include "common/shell_text.h"
 #include "fields.h"
 
+#include <nlohmann/json.hpp>
+
 namespace bakjob::ctl
 {
 

@@ -15,6 +15,7 @@
 #include <cstdint>
 #include <cstdio>
 #include <fcntl.h>
+#include <nlohmann/json.hpp>
 #include <optional>
 #include <sstream>
 #include <sys/ioctl.h>
