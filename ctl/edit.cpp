@@ -12,8 +12,6 @@
 #include "secret.h"
 #include "summary.h"
 
-#include <cstdio>
-
 namespace bakjob::ctl
 {
 

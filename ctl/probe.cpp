@@ -13,23 +13,26 @@ namespace bakjob::ctl
 namespace
 {
 
+// rsync's exit code for a folder that is not there. Its message can get lost on the way from the far end.
+constexpr int NO_SUCH_FOLDER = 3;
+
 struct Ended {
     std::string line; // the first one of the output
-    bool well;
+    int code;         // 0: well
 };
 
 Ended run(const std::optional<std::string> &command)
 {
-    if (!command || !fits_command(*command)) return {"a value is refused", false};
+    if (!command || !fits_command(*command)) return {"a value is refused", -1};
     ShellReader output(*command);
-    if (!output.started()) return {"the command could not be started", false};
+    if (!output.started()) return {"the command could not be started", -1};
     Ended ended{};
     std::string line;
     for (bool first = true; output.read_line(line); first = false) {
         if (first) ended.line = line;
     }
     trim_right(ended.line);
-    ended.well = output.close() == 0;
+    ended.code = exit_code(output.close());
     return ended;
 }
 
@@ -37,7 +40,8 @@ DaemonReply reply_of(const std::optional<std::string> &command)
 {
     const Ended ended = run(command);
     const RemoteReplyCode code = classify_reply_line(ended.line);
-    return {code == REPLY_OK && !ended.well ? REPLY_ERROR : code, ended.line};
+    if (code != REPLY_OK || ended.code == 0) return {code, ended.line};
+    return {ended.code == NO_SUCH_FOLDER ? REPLY_NO_DIR : REPLY_ERROR, ended.line};
 }
 
 } // namespace
@@ -46,7 +50,7 @@ LoginReply try_login(SshLogin login)
 {
     const Ended ended = run(ssh_test_command(CurrentJob, login));
     const auto result = judge_ssh_reply(ended.line);
-    return {result == SSH_OK && !ended.well ? SSH_FAILED : result, ended.line};
+    return {result == SSH_OK && ended.code != 0 ? SSH_FAILED : result, ended.line};
 }
 
 DaemonReply ask_daemon()
