@@ -1,6 +1,5 @@
 #include "cli/job_state.h"
 #include "cli/source_folders.h"
-#include "common/folder_table.h"
 #include "common/job_files.h"
 #include "common/password.h"
 #include "common/shell_text.h"
@@ -204,13 +203,10 @@ void Check::serial()
 void Check::folders()
 {
     const std::string root = rsync_remote_root(job_.job_name);
-    RsyncJob to_split = job_;
-    FolderTable folders{};
-    rsync_split_folders(to_split, folders);
-    if (folders.count == 0)
-        problem("local_path", "there is no folder", "bakjobctl set NAME local_path=FOLDER");
-    for (int i = 0; i < folders.count; ++i) {
-        folder(root, folders.entries[i]);
+    const auto folders = folders_of(job_);
+    if (folders.empty()) problem("local_path", "there is no folder", "bakjobctl set NAME local_path=FOLDER");
+    for (const std::string &each : folders) {
+        folder(root, each);
     }
 }
 

@@ -1,9 +1,9 @@
 #include "cli/source_folders.h"
-#include "common/folder_table.h"
 #include "common/job_files.h"
 #include "common/text.h"
 #include "config/current_job.h"
 #include "findings.h"
+#include "jobs.h"
 #include "on_signal.h"
 #include "probe.h"
 #include "remote/remote_dir.h"
@@ -199,11 +199,8 @@ void check_remote_side(const RsyncJob &job, Findings &findings)
     RemoteCheck check(job, probe, findings);
     if (!check.login() || !check.daemon() || !check.target()) return;
 
-    RsyncJob to_split = job;
-    FolderTable folders{};
-    rsync_split_folders(to_split, folders);
-    for (int i = 0; i < folders.count; ++i) {
-        check.folder(folders.entries[i]);
+    for (const std::string &folder : folders_of(job)) {
+        check.folder(folder);
     }
 }
 

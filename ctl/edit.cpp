@@ -2,7 +2,6 @@
 
 #include "commands.h"
 #include "common/shell_text.h"
-#include "common/text.h"
 #include "config/job_list.h"
 #include "config/schedule.h"
 #include "cron.h"

@@ -19,10 +19,7 @@ constexpr std::size_t LONGEST_PASSWORD = 93; // bytes whose base64 text fits its
 
 bool has_no_control(std::string_view text)
 {
-    return std::none_of(text.begin(), text.end(), [](char c) {
-        const auto code = static_cast<unsigned char>(c);
-        return code < ' ' || code == 127;
-    });
+    return !holds_control(text);
 }
 
 bool is_host(std::string_view text)

@@ -1,5 +1,7 @@
 #include "jobs.h"
 
+#include "cli/source_folders.h"
+#include "common/folder_table.h"
 #include "common/job_files.h"
 #include "common/shell_text.h"
 #include "config/config_lock.h"
@@ -65,6 +67,14 @@ void change_job(const std::string &name, const std::function<void(RsyncJob &)> &
         if (job == nullptr) no_such_job(name);
         change(*job);
     });
+}
+
+std::vector<std::string> folders_of(const RsyncJob &job)
+{
+    RsyncJob to_split = job;
+    FolderTable folders{};
+    rsync_split_folders(to_split, folders);
+    return {folders.entries, folders.entries + folders.count};
 }
 
 std::string name_for_shell(const std::string &name)

@@ -29,6 +29,9 @@ void change_jobs(const std::function<void()> &change);
 // The same for one job.
 void change_job(const std::string &name, const std::function<void(RsyncJob &)> &change);
 
+// The folders of a job that a run would transfer.
+std::vector<std::string> folders_of(const RsyncJob &job);
+
 // A job's name as a word of a shell's command line.
 std::string name_for_shell(const std::string &name);
 

@@ -1,5 +1,7 @@
 #include "output.h"
 
+#include "common/text.h"
+
 #include <algorithm>
 #include <cstdio>
 #include <nlohmann/json.hpp>
@@ -30,7 +32,7 @@ std::string printable(std::string_view text)
     for (char &c : result) {
         const auto code = static_cast<unsigned char>(c);
         const bool second_set = before == 0xC2 && code >= 0x80 && code < 0xA0; // in UTF-8
-        if (code < ' ' || code == 127 || second_set) c = '?';
+        if (is_control(c) || second_set) c = '?';
         before = code;
     }
     return result;

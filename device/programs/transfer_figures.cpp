@@ -1,5 +1,6 @@
 #include "transfer_figures.h"
 
+#include "common/handles.h"
 #include "stock_rsync.h"
 
 #include <algorithm>
@@ -59,13 +60,8 @@ public:
     explicit FiguresFile(const std::string &path)
     {
         unlink(path.c_str());
-        fd_ = open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0644);
-    }
-    FiguresFile(const FiguresFile &) = delete;
-    FiguresFile &operator=(const FiguresFile &) = delete;
-    ~FiguresFile()
-    {
-        if (fd_ >= 0) close(fd_);
+        fd_ =
+            bakjob::UniqueFd(open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0644));
     }
 
     void write(const Figures &figures) const
@@ -74,11 +70,12 @@ public:
         const int length = std::snprintf(line.data(), line.size(), "%20llu %20llu\n",
                                          static_cast<unsigned long long>(figures.files),
                                          static_cast<unsigned long long>(figures.bytes));
-        if (pwrite(fd_, line.data(), static_cast<std::size_t>(length), 0) < 0) return; // tries again soon
+        if (pwrite(fd_.get(), line.data(), static_cast<std::size_t>(length), 0) < 0)
+            return; // tries again soon
     }
 
 private:
-    int fd_;
+    bakjob::UniqueFd fd_;
 };
 
 // The figures are what stands in the output that a job's "-q" would suppress.

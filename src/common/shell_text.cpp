@@ -21,17 +21,6 @@ bool refused(const char *field, const char *why)
     return false;
 }
 
-bool is_control(char c)
-{
-    const auto code = static_cast<unsigned char>(c);
-    return code < ' ' || code == 127;
-}
-
-bool holds_control(std::string_view text)
-{
-    return std::any_of(text.begin(), text.end(), is_control);
-}
-
 bool holds_any(std::string_view text, std::string_view characters)
 {
     return text.find_first_of(characters) != std::string_view::npos;

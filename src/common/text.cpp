@@ -43,6 +43,11 @@ std::string format_text(const char *format, ...)
     return text;
 }
 
+bool holds_control(std::string_view text)
+{
+    return std::any_of(text.begin(), text.end(), is_control);
+}
+
 bool read_line(std::FILE *file, std::string &line)
 {
     line.clear();

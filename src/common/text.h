@@ -32,6 +32,14 @@ inline bool contains(std::string_view text, std::string_view part)
     return text.find(part) != std::string_view::npos;
 }
 
+inline bool is_control(char c)
+{
+    const auto code = static_cast<unsigned char>(c);
+    return code < ' ' || code == 127;
+}
+
+bool holds_control(std::string_view text);
+
 // Reads a line from a foreign text, without its line break; false at the end. Of a line longer than
 // LINE_LENGTH only so much is kept, which is more than fits any field: it is refused there, not taken for
 // another.
