@@ -15,6 +15,7 @@
 #include <array>
 #include <cerrno>
 #include <cstring>
+#include <optional>
 #include <unistd.h>
 
 namespace bakjob::ctl
@@ -52,6 +53,7 @@ private:
     void share_of(const std::string &root, const std::string &folder);
 
     const RsyncJob &job_;
+    const std::optional<JobName> name_ = JobName::checked(job_.job_name);
     Findings &findings_;
 };
 
@@ -77,7 +79,7 @@ Verdict verdict_on(const RsyncJob &job, const JobField &field)
 
 void Check::values()
 {
-    if (!is_job_name(job_.job_name)) {
+    if (!name_) {
         problem("job_name", "no run takes this name", "Add the job anew under another name.");
     }
     for (const JobField &field : job_fields()) {
@@ -91,7 +93,7 @@ void Check::values()
         problem("remote_path", "it begins with a slash instead of the daemon's module",
                 "bakjobctl set NAME remote_path=MODULE/FOLDER, or rsync_mode=path");
     }
-    if (*job_.rsync_pwd_file != '\0' && password_file(job_.job_name) != job_.rsync_pwd_file) {
+    if (*job_.rsync_pwd_file != '\0' && name_ && password_file(*name_) != job_.rsync_pwd_file) {
         problem("rsync_pwd_file", "the probes before a transfer read another one",
                 "Delete the job and add it anew.");
     }
@@ -146,8 +148,8 @@ void Check::runs()
     const Run run = run_of(job_.job_name);
     if (run == Run::GOING_ON) note("run", "one is going on now", "bakjobctl watch NAME follows it.");
     if (run == Run::LEFT_BEHIND) {
-        problem("run", "one died and left " + pid_file(job_.job_name) + ", so every other is refused",
-                "rm " + pid_file(job_.job_name) + " and bakjob -a clear that.");
+        problem("run", "one died and left " + pid_file(*name_) + ", so every other is refused",
+                "rm " + pid_file(*name_) + " and bakjob -a clear that.");
     }
     if (run == Run::NONE && rsync_state_is_running(job_.state) == 1) {
         note("state", "it says that a run is going on, but there is none", "bakjob -a clears that.");
@@ -202,7 +204,8 @@ void Check::serial()
 
 void Check::folders()
 {
-    const std::string root = rsync_remote_root(job_.job_name);
+    if (!name_) return;
+    const std::string root = rsync_remote_root(*name_);
     const auto folders = folders_of(job_);
     if (folders.empty()) problem("local_path", "there is no folder", "bakjobctl set NAME local_path=FOLDER");
     for (const std::string &each : folders) {

@@ -37,12 +37,12 @@ class ProbeJob
 public:
     explicit ProbeJob(const RsyncJob &job) : job_(job)
     {
-        copy_text(job_.job_name, "bakjobctl." + std::to_string(getpid()));
+        copy_text(job_.job_name, name_.text());
         job_.rsync_pwd_file[0] = '\0';
         if (job_.server_type == SERVER_SAME_KIND) copy_text(job_.rsync_user, "root"); // as the transfer does
         rsync_prepare_current_job(job_);
         copy_text(password_path, job_.rsync_pwd_file);
-        copy_text(config_path, remote_config_copy(job_.job_name));
+        copy_text(config_path, remote_config_copy(name_));
         on_signal_.emplace(remove_files);
         ready_ = rsync_write_password_file() || job.rsync_mode != RSYNC_MODE_DAEMON;
     }
@@ -52,8 +52,10 @@ public:
 
     [[nodiscard]] bool ready() const { return ready_; }
     [[nodiscard]] const RsyncJob &job() const { return job_; }
+    [[nodiscard]] const JobName &name() const { return name_; }
 
 private:
+    const JobName name_ = JobName::checked("bakjobctl." + std::to_string(getpid())).value();
     RsyncJob job_;
     std::optional<OnSignal> on_signal_;
     bool ready_ = false;
@@ -62,8 +64,8 @@ private:
 class RemoteCheck
 {
 public:
-    RemoteCheck(const RsyncJob &job, const ProbeJob &probe, Findings &findings)
-        : job_(job), probe_(probe), findings_(findings)
+    RemoteCheck(const RsyncJob &job, const JobName &name, const ProbeJob &probe, Findings &findings)
+        : job_(job), root_(rsync_remote_root(name)), probe_(probe), findings_(findings)
     {
     }
 
@@ -85,6 +87,7 @@ private:
     [[nodiscard]] bool to_module() const { return job_.rsync_mode == RSYNC_MODE_DAEMON; }
 
     const RsyncJob &job_;
+    const std::string root_;
     const ProbeJob &probe_;
     Findings &findings_;
 };
@@ -157,7 +160,7 @@ void RemoteCheck::preparation(const std::string &folder)
             "is not there yet, and the ssh login by which a run makes it " + std::string(advice.what) + ": " +
                 reply.line,
             denied ? "Give ssh_pwd the password of root over there, or make the folder there." : advice.todo);
-    } else if (!rsync_find_module_folder(CurrentJob.job_name, module)) {
+    } else if (!rsync_find_module_folder(probe_.name(), module)) {
         add(Verdict::PROBLEM, folder,
             "is not there yet, and /etc/rsyncd.conf over there has no header \"[ " + module +
                 " ]\" with a \"path = \" line, by which a run finds where to make it",
@@ -170,7 +173,7 @@ void RemoteCheck::preparation(const std::string &folder)
 void RemoteCheck::folder(const std::string &folder)
 {
     RsyncJob ended = probe_.job();
-    const bool found = rsync_resolve_folder(rsync_remote_root(job_.job_name), folder) == 0;
+    const bool found = rsync_resolve_folder(root_, folder) == 0;
     if (!found || !copy_text(ended.local_path, folder) || !rsync_set_ends(ended, folder)) return;
     copy_text(CurrentJob.remote_path, ended.remote_path);
     const DaemonReply target = look_for_target();
@@ -194,9 +197,10 @@ void RemoteCheck::folder(const std::string &folder)
 
 void check_remote_side(const RsyncJob &job, Findings &findings)
 {
+    const auto name = JobName::checked(job.job_name);
     const ProbeJob probe(job);
-    if (!probe.ready()) return; // the values say why
-    RemoteCheck check(job, probe, findings);
+    if (!name || !probe.ready()) return; // the values say why
+    RemoteCheck check(job, *name, probe, findings);
     if (!check.login() || !check.daemon() || !check.target()) return;
 
     for (const std::string &folder : folders_of(job)) {

@@ -2,7 +2,6 @@
 
 #include "cli/process_guard.h"
 #include "common/address.h"
-#include "common/shell_text.h"
 #include "fields.h"
 
 #include <nlohmann/json.hpp>
@@ -35,8 +34,9 @@ void judge(Summary &summary, const RsyncJob &job)
 
 Run run_of(const std::string &name)
 {
-    if (!is_job_name(name) || rsync_pid_file_absent(name)) return Run::NONE;
-    return rsync_running_process(name) != 0 ? Run::GOING_ON : Run::LEFT_BEHIND;
+    const auto checked = JobName::checked(name);
+    if (!checked || rsync_pid_file_absent(*checked)) return Run::NONE;
+    return rsync_running_process(*checked) != 0 ? Run::GOING_ON : Run::LEFT_BEHIND;
 }
 
 std::string times_of(const ScheduleEntry &entry)

@@ -77,7 +77,7 @@ std::optional<Figures> figures_in(const Published &published)
 }
 
 // Figures that are older than the folder, or than the size that its dry run found, are an earlier transfer's.
-Progress read_progress(const std::string &name)
+Progress read_progress(const JobName &name)
 {
     Progress progress;
     const auto folder = read_published(progress_file(name));
@@ -203,10 +203,11 @@ bool wait_for_start(const std::string &name)
 bool follow(const std::string &name, bool json)
 {
     Teller teller(json);
+    const auto checked = JobName::checked(name);
     bool restore = false;
     Clock::time_point next_look{};
     while (run_of(name) == Run::GOING_ON) {
-        teller.tell(read_progress(name));
+        if (checked) teller.tell(read_progress(*checked));
         if (Clock::now() >= next_look) {
             restore = rsync_state_is_running(read_job(name).record.rstate) == 1;
             next_look = Clock::now() + std::chrono::seconds(1);

@@ -33,7 +33,7 @@ class RecoverListing : public Appliance
 
 TEST_F(Guard, ThePidFileIsMadeByOneRunAlone)
 {
-    const std::string name = "it's $x";
+    const JobName name = named("it's $x");
     const std::string path = "/var/run/bakjob_it's $x.pid";
     EXPECT_TRUE(rsync_pid_file_absent(name));
     EXPECT_TRUE(rsync_write_pid_file(name));
@@ -51,10 +51,10 @@ TEST_F(Guard, ThePidFileIsMadeByOneRunAlone)
 
 TEST_F(Guard, KillingTakesTheProcessInThePidFileAndNothingElse)
 {
-    EXPECT_EQ(rsync_kill_job_process("none"), -1);
+    EXPECT_EQ(rsync_kill_job_process(named("none")), -1);
     for (const char *text : {"", "-1\n", "0\n", "12 34\n", "12;touch /tmp/x\n", "99999999999\n"}) {
         write_file("/var/run/bakjob_bad.pid", text);
-        EXPECT_EQ(rsync_kill_job_process("bad"), -1) << text;
+        EXPECT_EQ(rsync_kill_job_process(named("bad")), -1) << text;
     }
     for (const bool restore : {false, true}) {
         run_options = {};
@@ -64,7 +64,7 @@ TEST_F(Guard, KillingTakesTheProcessInThePidFileAndNothingElse)
         }
         write_file("/var/run/bakjob_a b.pid", std::to_string(victim) + "\n");
         usleep(50'000);
-        EXPECT_EQ(rsync_kill_job_process("a b"), 0);
+        EXPECT_EQ(rsync_kill_job_process(named("a b")), 0);
         int status = 0;
         ASSERT_EQ(waitpid(victim, &status, 0), victim);
         EXPECT_TRUE(WIFSIGNALED(status));
@@ -90,7 +90,7 @@ TEST_F(Guard, TransfersAreFoundByTheirJobsNameTakenLiterally)
             execl("/bin/sleep", name.c_str(), "4711", nullptr);
         }
         usleep(20'000);
-        rsync_kill_transfers(one.killed);
+        rsync_kill_transfers(named(one.killed));
         int status = 0;
         const bool ended =
             eventually([&] { return waitpid(transfer, &status, WNOHANG) == transfer; }, one.ends ? 5 : 0);

@@ -233,7 +233,7 @@ TEST_F(Remote, AMissingFolderIsMadeBelowTheModulesOwn)
         write_file("/tmp/config", one.config);
         write_file("/tmp/remote_rshareinfo_it's.txt", "old");
         unlink("/tmp/command");
-        EXPECT_EQ(rsync_prepare_remote_dir("it's", "backup", one.first, one.second),
+        EXPECT_EQ(rsync_prepare_remote_dir(named("it's"), "backup", one.first, one.second),
                   one.remote_command.empty() ? -1 : 7 << 8);
         EXPECT_EQ(read_file("/tmp/command"), one.remote_command);
         EXPECT_FALSE(exists("/tmp/remote_rshareinfo_it's.txt"));

@@ -57,7 +57,7 @@ protected:
         copy_text(job.local_path, FOLDER);
         for (const char *file : {"/tmp/calls", "/tmp/arguments"})
             unlink(file);
-        return rsync_run_backup("daily", job);
+        return rsync_run_backup(named("daily"), job);
     }
 
     static constexpr const char *FOLDER = "/mnt/HD/HD_a2/Public";

@@ -93,12 +93,12 @@ TEST_F(Folders, ProgressAndSerialAreReadAndWrittenSafely)
     const std::string path = "/tmp/rsync_bakcup_src_folder_name.it's";
     write_file("/tmp/victim", "kept");
     fs::create_symlink("/tmp/victim", path);
-    rsync_write_progress("it's", "/mnt/a", 3, 3);
+    rsync_write_progress(named("it's"), "/mnt/a", 3, 3);
     EXPECT_EQ(read_file(path), "/mnt/a\n3/3\n");
     EXPECT_EQ(read_file("/tmp/victim"), "kept");
-    rsync_write_progress("it's", "", 1, 1);
+    rsync_write_progress(named("it's"), "", 1, 1);
     EXPECT_EQ(read_file(path), "/mnt/a\n3/3\n");
-    rsync_remove_progress("it's");
+    rsync_remove_progress(named("it's"));
     EXPECT_FALSE(exists(path));
 
     char serial[SERIAL_SIZE] = "as it was";

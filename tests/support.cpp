@@ -163,6 +163,11 @@ void add_share(const std::string &name, const std::string &path)
     fs::create_directories(path);
 }
 
+bakjob::JobName named(const std::string &name)
+{
+    return bakjob::JobName::checked(name).value();
+}
+
 bakjob::RsyncJob make_job(const std::string &name)
 {
     bakjob::RsyncJob job{};

@@ -3,6 +3,7 @@
 // What the tests share: an appliance in its first state, jobs in its store, small scripts in the place of its
 // programs, and a look at what a run left.
 
+#include "common/job_name.h"
 #include "config/job.h"
 
 #include <functional>
@@ -48,6 +49,9 @@ void store_save();
 int add_job(const Keys &keys);
 std::string job_key(int item, const std::string &key);
 void add_share(const std::string &name, const std::string &path);
+
+// A job's name that is one.
+bakjob::JobName named(const std::string &name);
 
 // A record as the loader leaves it: passwords in base64.
 bakjob::RsyncJob make_job(const std::string &name);

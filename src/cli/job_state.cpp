@@ -3,7 +3,6 @@
 #include "cli/process_guard.h"
 #include "common/job_files.h"
 #include "common/run_options.h"
-#include "common/shell_text.h"
 #include "common/text.h"
 #include "config/config_lock.h"
 #include "config/job_list.h"
@@ -75,7 +74,8 @@ void rsync_reset_stale_states()
     bool changed = false;
     for (RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
         // A name that no run can have has no pid file either.
-        if (is_job_name(job->job_name) && !rsync_pid_file_absent(job->job_name)) continue;
+        const auto name = JobName::checked(job->job_name);
+        if (name && !rsync_pid_file_absent(*name)) continue;
         changed |= reset_if_stale(job->state, job->last_do_job_time, now);
         changed |= reset_if_stale(job->rstate, job->rlast_do_job_time, now);
     }

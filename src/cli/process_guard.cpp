@@ -51,15 +51,15 @@ bool runs_job(pid_t pid, std::string_view job_name)
 
 } // namespace
 
-bool rsync_pid_file_absent(const std::string &job_name)
+bool rsync_pid_file_absent(const JobName &job)
 {
     struct stat status = {};
-    return lstat(pid_file(job_name).c_str(), &status) != 0;
+    return lstat(pid_file(job).c_str(), &status) != 0;
 }
 
-bool rsync_write_pid_file(const std::string &job_name)
+bool rsync_write_pid_file(const JobName &job)
 {
-    const std::string path = pid_file(job_name);
+    const std::string path = pid_file(job);
     const UniqueFd file = create_file(path, 0644);
     if (!file) return false;
     if (write_all(file.get(), format_text("%d\n", getpid()))) return true;
@@ -69,15 +69,15 @@ bool rsync_write_pid_file(const std::string &job_name)
     return false;
 }
 
-pid_t rsync_running_process(const std::string &job_name)
+pid_t rsync_running_process(const JobName &job)
 {
-    const pid_t pid = process_id_in(pid_file(job_name));
-    return pid > 0 && runs_job(pid, job_name) ? pid : 0;
+    const pid_t pid = process_id_in(pid_file(job));
+    return pid > 0 && runs_job(pid, job.text()) ? pid : 0;
 }
 
-int rsync_remove_pid_file(const std::string &job_name)
+int rsync_remove_pid_file(const JobName &job)
 {
-    return unlink(pid_file(job_name).c_str());
+    return unlink(pid_file(job).c_str());
 }
 
 std::string rsync_ps_command()
@@ -85,16 +85,16 @@ std::string rsync_ps_command()
     return run_shell("ps -ww >/dev/null 2>&1") == 0 ? "ps -ww" : "ps";
 }
 
-int rsync_kill_job_process(const std::string &job_name)
+int rsync_kill_job_process(const JobName &job)
 {
-    if (rsync_pid_file_absent(job_name)) return -1;
-    const std::string path = pid_file(job_name);
+    if (rsync_pid_file_absent(job)) return -1;
+    const std::string path = pid_file(job);
     if (process_id_in(path) == 0) {
         DebugLog("ERROR: no process id in [%s]\n", path.c_str());
         return -1;
     }
     const std::string ps = rsync_ps_command();
-    const std::string file = in_backquotes(shell_word(path));
+    const std::string file = in_backquotes(escape_path(path));
     const std::string is_restore =
         format_text("%s | grep `cat %s`'' | grep -- ' -i ' | grep -v '%s'  >/dev/null 2>&1", ps.c_str(),
                     file.c_str(), ps.c_str());
@@ -102,12 +102,12 @@ int rsync_kill_job_process(const std::string &job_name)
     return run_shell(format_text("kill -9 `cat %s`", file.c_str()));
 }
 
-void rsync_kill_transfers(const std::string &job_name)
+void rsync_kill_transfers(const JobName &job)
 {
     const std::string ps = rsync_ps_command();
     run_shell(format_text("kill -9 `%s | grep /usr/sbin/rsync | grep job-name=%s | grep -v '%s' "
                           "| awk '{ print $1 }'`  >/dev/null 2>&1",
-                          ps.c_str(), in_backquotes(grep_word(job_name)).c_str(), ps.c_str()));
+                          ps.c_str(), in_backquotes(grep_word(job.text())).c_str(), ps.c_str()));
 }
 
 } // namespace bakjob

@@ -1,7 +1,9 @@
 #pragma once
 
 // Keeps a job from running twice, and stops it: a pid file per job, and the job's name on the command line of
-// each of its rsync processes. All operations take a job name that is_job_name accepts.
+// each of its rsync processes.
+
+#include "common/job_name.h"
 
 #include <string>
 #include <sys/types.h>
@@ -11,27 +13,27 @@ namespace bakjob
 
 // Whether nothing stands where the job's pid file would. A file left behind by a run that died counts as a
 // running job until rsync_kill_job removes it.
-bool rsync_pid_file_absent(const std::string &job_name);
+bool rsync_pid_file_absent(const JobName &job);
 
 // Makes the pid file, with this process's id. False (errno) when it cannot be made; EEXIST: another run was
 // quicker.
-bool rsync_write_pid_file(const std::string &job_name);
+bool rsync_write_pid_file(const JobName &job);
 
 // The process that the job's pid file names, if it is one that runs the job; else 0, also for another process
 // that has got its number.
-pid_t rsync_running_process(const std::string &job_name);
+pid_t rsync_running_process(const JobName &job);
 
 // 0 when the file was there and is gone, else -1.
-int rsync_remove_pid_file(const std::string &job_name);
+int rsync_remove_pid_file(const JobName &job);
 
 // The listing of processes that works here: "ps -ww" or "ps".
 std::string rsync_ps_command();
 
 // Kills the process that the pid file names, and notes in `restore_mode` whether it was a restore run. The
 // kill command's wait status, 0 for success; -1 without a pid file or when it holds no process id.
-int rsync_kill_job_process(const std::string &job_name);
+int rsync_kill_job_process(const JobName &job);
 
 // Kills every rsync process whose command line holds "job-name=" followed by the name.
-void rsync_kill_transfers(const std::string &job_name);
+void rsync_kill_transfers(const JobName &job);
 
 } // namespace bakjob

@@ -7,7 +7,6 @@
 #include "common/debug_log.h"
 #include "common/job_files.h"
 #include "common/run_options.h"
-#include "common/shell_text.h"
 #include "config/job_list.h"
 #include "config/job_store.h"
 #include "platform/config_store.h"
@@ -34,16 +33,13 @@ bool is_restore_run()
     return run_options.restore_mode == 1;
 }
 
-std::optional<RsyncJob> load_enabled_job(const std::string &job_name)
+std::optional<RsyncJob> load_enabled_job(const JobName &name)
 {
     std::optional<RsyncJob> copy;
-    if (is_job_name(job_name)) {
-        rsync_load_jobs();
-        const RsyncJob *const job = rsync_find_job(job_name);
-        if (job != nullptr && job->enable != 0) rsync_copy_job(copy.emplace(), *job);
-        rsync_free_jobs();
-    }
-    if (!copy) DebugLog("ERROR: not found this job_name [%s] or disabled\n", job_name.c_str());
+    rsync_load_jobs();
+    const RsyncJob *const job = rsync_find_job(name.text());
+    if (job != nullptr && job->enable != 0) rsync_copy_job(copy.emplace(), *job);
+    rsync_free_jobs();
     return copy;
 }
 
@@ -55,13 +51,13 @@ bool is_due(const RsyncJob &job, bool force)
     return job.inc_enable == 1 && rsync_list_snapshots(job.job_name) != 0;
 }
 
-bool take_pid_file(const std::string &job_name)
+bool take_pid_file(const JobName &name)
 {
-    if (rsync_write_pid_file(job_name)) return true;
+    if (rsync_write_pid_file(name)) return true;
     if (errno == EEXIST) {
         DebugLog("ERROR: rsync backup is running!\n");
     } else {
-        DebugLog("ERROR: pid file [%s]: %s\n", pid_file(job_name).c_str(), std::strerror(errno));
+        DebugLog("ERROR: pid file [%s]: %s\n", pid_file(name).c_str(), std::strerror(errno));
     }
     return false;
 }
@@ -81,27 +77,27 @@ struct FolderPlace {
 };
 
 // `job` is a copy for this folder alone.
-bool run_folder(RsyncJob job, const std::string &job_name, const std::string &root, const FolderPlace &place)
+bool run_folder(RsyncJob job, const JobName &name, const std::string &root, const FolderPlace &place)
 {
     copy_text(job.local_path, place.folder);
     bool done = rsync_resolve_folder(root, place.folder) == 0;
     if (done) {
-        rsync_write_progress(job_name, place.folder, place.index, place.count);
-        done = rsync_set_ends(job, place.folder) && rsync_run_backup(job_name, job) == BACKUP_DONE;
+        rsync_write_progress(name, place.folder, place.index, place.count);
+        done = rsync_set_ends(job, place.folder) && rsync_run_backup(name, job) == BACKUP_DONE;
     }
     raise_alert(job, done);
     return done;
 }
 
-bool run_folders(const RsyncJob &job, const std::string &job_name)
+bool run_folders(const RsyncJob &job, const JobName &name)
 {
-    const std::string root = rsync_remote_root(job_name);
+    const std::string root = rsync_remote_root(name);
     RsyncJob to_split = job;
     FolderTable folders{};
     rsync_split_folders(to_split, folders);
     bool all_done = true;
     for (int i = 0; i < folders.count; ++i) {
-        all_done &= run_folder(job, job_name, root, {folders.entries[i], i + 1, folders.count});
+        all_done &= run_folder(job, name, root, {folders.entries[i], i + 1, folders.count});
     }
     if (folders.left_out > 0) {
         DebugLog("ERROR: local_path refused: %d folders too many or too long\n", folders.left_out);
@@ -134,33 +130,39 @@ void rsync_alert_text(const RsyncJob &job)
 
 bool rsync_run_job(const std::string &job_name, bool force, bool &outcome)
 {
-    if (is_job_name(job_name) && !rsync_pid_file_absent(job_name)) {
+    const auto name = JobName::checked(job_name);
+    if (name && !rsync_pid_file_absent(*name)) {
         DebugLog("ERROR: rsync backup is running!\n");
         return false;
     }
-    auto job = load_enabled_job(job_name);
-    if (!job || !is_due(*job, force)) return false;
+    auto job = name ? load_enabled_job(*name) : std::nullopt;
+    if (!job) {
+        DebugLog("ERROR: not found this job_name [%s] or disabled\n", job_name.c_str());
+        return false;
+    }
+    if (!is_due(*job, force)) return false;
     if (is_restore_run()) job->backup_type = BACKUP_PULL;
-    if (!take_pid_file(job_name)) return false;
+    if (!take_pid_file(*name)) return false;
 
     rsync_set_job_state(job_name, JOB_STARTING);
-    if (!run_folders(*job, job_name)) outcome = false;
+    if (!run_folders(*job, *name)) outcome = false;
     rsync_set_job_state(job_name, final_state(*job, outcome));
-    rsync_remove_pid_file(job_name);
+    rsync_remove_pid_file(*name);
     return true;
 }
 
 void rsync_kill_job(const std::string &job_name)
 {
-    if (!is_job_name(job_name)) {
+    const auto name = JobName::checked(job_name);
+    if (!name) {
         DebugLog("ERROR: job name refused: [%s]\n", job_name.c_str());
         return;
     }
-    if (rsync_kill_job_process(job_name) == 0) std::puts("kill rsync job success .....");
-    rsync_kill_transfers(job_name);
+    if (rsync_kill_job_process(*name) == 0) std::puts("kill rsync job success .....");
+    rsync_kill_transfers(*name);
     rsync_set_job_state(job_name, JOB_KILLED);
-    rsync_remove_progress(job_name);
-    rsync_remove_pid_file(job_name);
+    rsync_remove_progress(*name);
+    rsync_remove_pid_file(*name);
 }
 
 } // namespace bakjob

@@ -105,7 +105,7 @@ int rsync_resolve_folder(const std::string &remote_backup_root, const std::strin
     return chdir(share_path);
 }
 
-std::string rsync_remote_root(const std::string &job_name)
+std::string rsync_remote_root(const JobName &job)
 {
     char serial[SERIAL_SIZE] = "";
     rsync_read_serial(serial);
@@ -113,7 +113,7 @@ std::string rsync_remote_root(const std::string &job_name)
         DebugLog("ERROR: line break in the serial text of [%s]: no remote folder can be named\n",
                  SERIAL_FILE);
     }
-    return format_text("/%s_remote_backup/%s", serial, job_name.c_str());
+    return format_text("/%s_remote_backup/%s", serial, job.c_str());
 }
 
 bool rsync_set_ends(RsyncJob &job, const std::string &folder)
@@ -129,15 +129,15 @@ bool rsync_set_ends(RsyncJob &job, const std::string &folder)
     return false;
 }
 
-void rsync_write_progress(const std::string &job_name, const std::string &folder, int index, int count)
+void rsync_write_progress(const JobName &job, const std::string &folder, int index, int count)
 {
     if (folder.empty()) return;
-    replace_file(progress_file(job_name), 0644, format_text("%s\n%d/%d\n", folder.c_str(), index, count));
+    replace_file(progress_file(job), 0644, format_text("%s\n%d/%d\n", folder.c_str(), index, count));
 }
 
-void rsync_remove_progress(const std::string &job_name)
+void rsync_remove_progress(const JobName &job)
 {
-    unlink(progress_file(job_name).c_str());
+    unlink(progress_file(job).c_str());
 }
 
 int rsync_read_serial(char (&serial)[SERIAL_SIZE])

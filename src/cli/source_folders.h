@@ -5,6 +5,7 @@
 // below its `remote_path` in SERIAL_remote_backup/JOB/SHARE/FOLDER.
 
 #include "common/folder_table.h"
+#include "common/job_name.h"
 #include "common/text.h"
 #include "config/job.h"
 
@@ -31,15 +32,15 @@ void rsync_split_folders(RsyncJob &job, FolderTable &table);
 int rsync_resolve_folder(const std::string &remote_backup_root, const std::string &folder);
 
 // The folder below a job's `remote_path` in which all its data lies, "/SERIAL_remote_backup/JOB".
-std::string rsync_remote_root(const std::string &job_name);
+std::string rsync_remote_root(const JobName &job);
 
 // Points the job at the two ends of the folder that was just resolved: `local_path` in a restore run at the
 // share, `remote_path` at the folder's place. False when that does not fit.
 bool rsync_set_ends(RsyncJob &job, const std::string &folder);
 
 // Publishes which folder (`index` from 1 of `count`) is being transferred.
-void rsync_write_progress(const std::string &job_name, const std::string &folder, int index, int count);
-void rsync_remove_progress(const std::string &job_name);
+void rsync_write_progress(const JobName &job, const std::string &folder, int index, int count);
+void rsync_remove_progress(const JobName &job);
 
 // Reads the device's serial text: the first line of its file, line break included, at most 127 bytes. -1, and
 // the buffer untouched, when the file cannot be opened.

@@ -21,34 +21,34 @@ std::string snapshot_prefix(std::string_view job_name)
 
 } // namespace
 
-std::string pid_file(std::string_view job_name)
+std::string pid_file(const JobName &job)
 {
-    return named_after("/var/run/bakjob_", job_name, ".pid");
+    return named_after("/var/run/bakjob_", job.text(), ".pid");
 }
 
-std::string password_file(std::string_view job_name)
+std::string password_file(const JobName &job)
 {
-    return named_after("/tmp/r_", job_name, ".passwd");
+    return named_after("/tmp/r_", job.text(), ".passwd");
 }
 
-std::string progress_file(std::string_view job_name)
+std::string progress_file(const JobName &job)
 {
-    return named_after("/tmp/rsync_bakcup_src_folder_name.", job_name);
+    return named_after("/tmp/rsync_bakcup_src_folder_name.", job.text());
 }
 
-std::string transfer_file(std::string_view job_name)
+std::string transfer_file(const JobName &job)
 {
-    return named_after("/tmp/r_", job_name);
+    return named_after("/tmp/r_", job.text());
 }
 
-std::string transfer_size_file(std::string_view job_name)
+std::string transfer_size_file(const JobName &job)
 {
-    return named_after("/tmp/r_", job_name, ".dump_size");
+    return named_after("/tmp/r_", job.text(), ".dump_size");
 }
 
-std::string remote_config_copy(std::string_view job_name)
+std::string remote_config_copy(const JobName &job)
 {
-    return named_after("/tmp/remote_rshareinfo_", job_name, ".txt");
+    return named_after("/tmp/remote_rshareinfo_", job.text(), ".txt");
 }
 
 std::string snapshot_name(std::string_view job_name, std::int64_t number)

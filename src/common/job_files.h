@@ -1,7 +1,9 @@
 #pragma once
 
-// Every name that the module gives to a file, built and recognised here alone. The functions take a job name
-// that is_job_name (shell_text.h) accepts; paths are not escaped for the shell.
+// Every name that the module gives to a file, built and recognised here alone. Paths are not escaped for the
+// shell.
+
+#include "common/job_name.h"
 
 #include <cstdint>
 #include <string>
@@ -15,16 +17,16 @@ inline constexpr const char *CONFIG_LOCK_FILE = "/tmp/rsync_write_conf.lock";
 inline constexpr const char *SERIAL_FILE = "/tmp/kv_serial.txt";
 inline constexpr const char *TRACE_FILE = "/tmp/rsync_debug";
 
-std::string pid_file(std::string_view job_name);
-std::string password_file(std::string_view job_name);
-std::string progress_file(std::string_view job_name);
+std::string pid_file(const JobName &job);
+std::string password_file(const JobName &job);
+std::string progress_file(const JobName &job);
 
 // Written by the appliance's rsync: what a transfer has moved, and the sizes that its dry run found.
-std::string transfer_file(std::string_view job_name);
-std::string transfer_size_file(std::string_view job_name);
+std::string transfer_file(const JobName &job);
+std::string transfer_size_file(const JobName &job);
 
 // Local copy of the remote daemon's configuration.
-std::string remote_config_copy(std::string_view job_name);
+std::string remote_config_copy(const JobName &job);
 inline constexpr const char *DISCOVERY_CONFIG_COPY = "/tmp/remote_rinfo.txt";
 inline constexpr const char *DISCOVERY_LOCK_FILE = "/tmp/remote_rinfo.lock";
 

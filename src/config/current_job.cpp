@@ -10,7 +10,8 @@ RsyncJob CurrentJob{};
 
 void rsync_prepare_current_job(RsyncJob &job)
 {
-    if (job.rsync_pwd_file[0] == '\0') copy_text(job.rsync_pwd_file, password_file(job.job_name));
+    const auto name = JobName::checked(job.job_name);
+    if (job.rsync_pwd_file[0] == '\0' && name) copy_text(job.rsync_pwd_file, password_file(*name));
     rsync_copy_job(CurrentJob, job);
     if (CurrentJob.rsync_user[0] == '\0') copy_text(CurrentJob.rsync_user, "root");
     if (CurrentJob.rsync_pwd[0] == '\0') {

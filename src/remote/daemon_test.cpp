@@ -27,6 +27,7 @@ std::optional<std::string> module_list_command(const RsyncJob &job)
 
 std::optional<std::string> write_test_command(const RsyncJob &job, int direction)
 {
+    if (!has_whole_texts(job)) return std::nullopt;
     if (job.remote_ip[0] == '\0' || !is_safe_host(job.remote_ip)) return std::nullopt;
     if (!is_safe_rsync_user(job.rsync_user)) return std::nullopt;
     const auto path = shell_path_part("remote_path", job.remote_path);
@@ -36,8 +37,9 @@ std::optional<std::string> write_test_command(const RsyncJob &job, int direction
     const bool pull = job.backup_type == BACKUP_PULL && direction == 0;
     std::string password;
     if (daemon) {
-        const std::string file = password_file(job.job_name);
-        password = format_text("--password-file=%s ", in_double_quotes(file).c_str());
+        const auto name = JobName::checked(job.job_name);
+        if (!name) return std::nullopt;
+        password = format_text("--password-file=%s ", in_double_quotes(password_file(*name)).c_str());
     }
     const std::string remote = format_text("%s@%s%s%s", job.rsync_user, bracketed_host(job.remote_ip).c_str(),
                                            daemon ? "::" : ":", path->c_str());

@@ -47,9 +47,9 @@ int make_remote_dir(const std::string &folder, const std::string &target)
 
 } // namespace
 
-std::optional<std::string> rsync_find_module_folder(const std::string &job_name, const std::string &module)
+std::optional<std::string> rsync_find_module_folder(const JobName &job, const std::string &module)
 {
-    const std::string local_copy = remote_config_copy(job_name);
+    const std::string local_copy = remote_config_copy(job);
     unlink(local_copy.c_str());
     if (!fetch_daemon_config(local_copy)) return std::nullopt;
     auto folder = module_folder(local_copy, module);
@@ -58,10 +58,10 @@ std::optional<std::string> rsync_find_module_folder(const std::string &job_name,
     return folder;
 }
 
-int rsync_prepare_remote_dir(const std::string &job_name, const std::string &module, const std::string &first,
+int rsync_prepare_remote_dir(const JobName &job, const std::string &module, const std::string &first,
                              const std::string &second)
 {
-    const auto folder = rsync_find_module_folder(job_name, module);
+    const auto folder = rsync_find_module_folder(job, module);
     return folder ? make_remote_dir(*folder, first + '/' + second) : -1;
 }
 

@@ -41,7 +41,7 @@ bool keeps_snapshots(const RsyncJob &job)
 }
 
 // Makes the folder that the write test missed, where that is possible. Whether the run may go on.
-bool prepare_missing_target(const std::string &job_name, const RsyncJob &job)
+bool prepare_missing_target(const JobName &job_name, const RsyncJob &job)
 {
     if (job.backup_type != BACKUP_PUSH) return false;
     const std::string_view remote_path = job.remote_path;
@@ -54,7 +54,7 @@ bool prepare_missing_target(const std::string &job_name, const RsyncJob &job)
 }
 
 // Nothing when the remote side is ready for the transfer.
-std::optional<BackupResult> check_remote_side(const std::string &job_name, const RsyncJob &job)
+std::optional<BackupResult> check_remote_side(const JobName &job_name, const RsyncJob &job)
 {
     if (is_recover_run()) {
         if (rsync_write_test(1) != REPLY_OK) return BACKUP_RECOVER_FAILED;
@@ -79,7 +79,7 @@ std::string dry_run_of(const std::string &command)
 
 // Up to `retry` passes, at least one, each a dry run and, if that went well, the transfer. The exit code of
 // the last command.
-int transfer_with_retries(const std::string &job_name, const RsyncJob &job, const std::string &command)
+int transfer_with_retries(const JobName &job_name, const RsyncJob &job, const std::string &command)
 {
     const std::string dry_run = dry_run_of(command);
     DebugLog("rsync_cmd = [%s]\n", dry_run.c_str());
@@ -138,7 +138,7 @@ int select_sleep(int seconds, int milliseconds)
     return select(0, nullptr, nullptr, nullptr, &time);
 }
 
-BackupResult rsync_run_backup(const std::string &job_name, RsyncJob &job)
+BackupResult rsync_run_backup(const JobName &job_name, RsyncJob &job)
 {
     rsync_prepare_current_job(job);
     if (job.server_type != SERVER_SAME_KIND && job.server_type != SERVER_ANY) {
@@ -159,7 +159,7 @@ BackupResult rsync_run_backup(const std::string &job_name, RsyncJob &job)
         rsync_snapshot_rotate(job.local_path, job.inc_number, job.job_name);
     }
     DebugLog("rsync_cmd = [%s]\n", command->c_str());
-    rsync_set_job_state(job_name, is_recover_run() ? JOB_RECOVER_RUNNING : JOB_RUNNING);
+    rsync_set_job_state(job_name.text(), is_recover_run() ? JOB_RECOVER_RUNNING : JOB_RUNNING);
     const int code = transfer_with_retries(job_name, job, *command);
     if (keeps_snapshots(job)) {
         DebugLog("inc_root_path = [%s]\n", run_options.inc_root_path);

@@ -2,6 +2,7 @@
 
 // The transfer of one source folder of one job: probes, preparation, snapshots, dry run, transfer, retries.
 
+#include "common/job_name.h"
 #include "config/job.h"
 
 #include <optional>
@@ -21,7 +22,7 @@ enum BackupResult : int {
 // Transfers the job's one folder. `job_name` is the name given on the command line; of the job only an empty
 // `rsync_pwd_file` is changed. Blocks for as long as the probes, the transfers and the waits between them
 // take.
-BackupResult rsync_run_backup(const std::string &job_name, RsyncJob &job);
+BackupResult rsync_run_backup(const JobName &job_name, RsyncJob &job);
 
 // The command of the transfer (rsync_command.h); also nothing when its dry run would not fit.
 std::optional<std::string> rsync_transfer_command(const RsyncJob &job);

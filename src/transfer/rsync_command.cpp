@@ -29,8 +29,9 @@ bool is_safe(const RsyncJob &job)
     const bool named = CurrentJob.server_type != SERVER_SAME_KIND;
     const bool daemon_user = named && job.rsync_mode == RSYNC_MODE_DAEMON;
     const bool ssh_user = named && job.use_ssh == 1;
-    return (job.job_name[0] == '\0' || is_job_name(job.job_name)) && is_safe_host(job.remote_ip) &&
-           is_safe_port(job.port) && (!daemon_user || is_safe_rsync_user(job.rsync_user)) &&
+    return has_whole_texts(job) && (job.job_name[0] == '\0' || is_job_name(job.job_name)) &&
+           is_safe_host(job.remote_ip) && is_safe_port(job.port) &&
+           (!daemon_user || is_safe_rsync_user(job.rsync_user)) &&
            (!ssh_user || is_safe_ssh_user(job.ssh_user));
 }
 
