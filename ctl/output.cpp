@@ -1,7 +1,5 @@
 #include "output.h"
 
-#include "common/text.h"
-
 #include <algorithm>
 #include <cstdio>
 #include <nlohmann/json.hpp>
@@ -24,19 +22,6 @@ std::size_t width_of(std::string_view text)
 }
 
 } // namespace
-
-std::string printable(std::string_view text)
-{
-    std::string result(text);
-    unsigned char before = 0;
-    for (char &c : result) {
-        const auto code = static_cast<unsigned char>(c);
-        const bool second_set = before == 0xC2 && code >= 0x80 && code < 0xA0; // in UTF-8
-        if (is_control(c) || second_set) c = '?';
-        before = code;
-    }
-    return result;
-}
 
 std::string_view fitting(std::string_view text, std::size_t columns)
 {

@@ -3,6 +3,8 @@
 // What the commands print: tables for people, JSON for programs. Whoever makes JSON includes
 // <nlohmann/json.hpp>.
 
+#include "common/text.h"
+
 #include <nlohmann/json_fwd.hpp>
 #include <string>
 #include <string_view>
@@ -13,9 +15,6 @@ namespace bakjob::ctl
 
 using Json = nlohmann::ordered_json;
 using Row = std::vector<std::string>;
-
-// The text with what a terminal would act on replaced by '?'.
-std::string printable(std::string_view text);
 
 // The start of the text that fits so many columns.
 std::string_view fitting(std::string_view text, std::size_t columns);

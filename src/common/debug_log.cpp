@@ -3,10 +3,12 @@
 #include "common/job_files.h"
 #include "common/private_file.h"
 #include "common/run_options.h"
+#include "common/text.h"
 
 #include <cstdarg>
 #include <cstdio>
 #include <fcntl.h>
+#include <string>
 #include <unistd.h>
 
 namespace bakjob
@@ -27,6 +29,15 @@ void append_to_file(const char *format, va_list arguments)
     if (file) write_all(file.get(), last_message);
 }
 
+// What a name or a remote side smuggles into a message must not act on a terminal.
+void show(const char *format, va_list arguments)
+{
+    std::string message = format_text(format, arguments);
+    const bool ends_line = message.ends_with('\n');
+    if (ends_line) message.pop_back();
+    std::printf("%s%s", printable(message).c_str(), ends_line ? "\n" : "");
+}
+
 } // namespace
 
 void DebugLog(const char *format, ...)
@@ -35,7 +46,11 @@ void DebugLog(const char *format, ...)
     va_list arguments;
     va_start(arguments, format);
     if (run_options.debug_mode == 1) {
-        std::vprintf(format, arguments);
+        if (isatty(STDOUT_FILENO) == 1) {
+            show(format, arguments);
+        } else {
+            std::vprintf(format, arguments);
+        }
         std::fflush(stdout);
     } else {
         append_to_file(format, arguments);

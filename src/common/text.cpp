@@ -1,7 +1,6 @@
 #include "common/text.h"
 
 #include <algorithm>
-#include <cstdarg>
 #include <cstdio>
 #include <cstring>
 
@@ -19,6 +18,35 @@ bool is_trimmed(char c)
     return code <= ' ' || code == 127;
 }
 
+struct Character {
+    char32_t code;
+    std::size_t length; // bytes; 0: no UTF-8
+};
+
+Character first_character(std::string_view text)
+{
+    const auto first = static_cast<unsigned char>(text.front());
+    if (first < 0x80) return {first, 1};
+    const std::size_t length = first >= 0xF0 ? 4 : first >= 0xE0 ? 3 : 2;
+    constexpr char32_t LOWEST[] = {0, 0, 0x80, 0x800, 0x10000}; // that takes so many bytes
+    if (first < 0xC2 || first > 0xF4 || text.size() < length) return {0, 0};
+    char32_t code = first & (0x7FU >> length);
+    for (const char c : text.substr(1, length - 1)) {
+        if ((c & 0xC0) != 0x80) return {0, 0};
+        code = code << 6U | (static_cast<unsigned char>(c) & 0x3FU);
+    }
+    const bool surrogate = code >= 0xD800 && code < 0xE000;
+    if (code < LOWEST[length] || surrogate || code > 0x10FFFF) return {0, 0};
+    return {code, length};
+}
+
+bool is_unshown(char32_t code)
+{
+    const auto within = [&](char32_t first, char32_t last) { return code >= first && code <= last; };
+    return code < 0x20 || within(0x7F, 0x9F) || within(0x200E, 0x200F) || within(0x2028, 0x202E) ||
+           within(0x2066, 0x2069);
+}
+
 } // namespace
 
 bool copy_text(char *field, std::size_t size, std::string_view source)
@@ -29,23 +57,41 @@ bool copy_text(char *field, std::size_t size, std::string_view source)
     return true;
 }
 
+std::string format_text(const char *format, va_list arguments)
+{
+    va_list again;
+    va_copy(again, arguments);
+    const int length = std::vsnprintf(nullptr, 0, format, again);
+    va_end(again);
+    std::string text(length > 0 ? static_cast<std::size_t>(length) : 0, '\0');
+    if (length > 0) std::vsnprintf(text.data(), text.size() + 1, format, arguments);
+    return text;
+}
+
 std::string format_text(const char *format, ...)
 {
     va_list arguments;
-    va_list again;
     va_start(arguments, format);
-    va_copy(again, arguments);
-    const int length = std::vsnprintf(nullptr, 0, format, arguments);
+    std::string text = format_text(format, arguments);
     va_end(arguments);
-    std::string text(length > 0 ? static_cast<std::size_t>(length) : 0, '\0');
-    if (length > 0) std::vsnprintf(text.data(), text.size() + 1, format, again);
-    va_end(again);
     return text;
 }
 
 bool holds_control(std::string_view text)
 {
     return std::any_of(text.begin(), text.end(), is_control);
+}
+
+std::string printable(std::string_view text)
+{
+    std::string shown;
+    while (!text.empty()) {
+        const Character character = first_character(text);
+        const bool plain = character.length > 0 && !is_unshown(character.code);
+        shown += plain ? text.substr(0, character.length) : "?";
+        text.remove_prefix(std::max<std::size_t>(character.length, 1));
+    }
+    return shown;
 }
 
 bool read_line(std::FILE *file, std::string &line)

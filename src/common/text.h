@@ -3,6 +3,7 @@
 // Small text routines: bounded copies into record fields, formatting, trimming, and the escape rule for
 // paths. The rules about what may go into a command at all are in shell_text.h.
 
+#include <cstdarg>
 #include <cstddef>
 #include <cstdio>
 #include <optional>
@@ -26,6 +27,7 @@ bool copy_text(char (&field)[N], std::string_view source)
 
 // printf into a string of whatever length it takes.
 [[gnu::format(printf, 1, 2)]] std::string format_text(const char *format, ...);
+[[gnu::format(printf, 1, 0)]] std::string format_text(const char *format, va_list arguments);
 
 inline bool contains(std::string_view text, std::string_view part)
 {
@@ -39,6 +41,10 @@ inline bool is_control(char c)
 }
 
 bool holds_control(std::string_view text);
+
+// The text with '?' for whatever a terminal would act on instead of showing it: control characters, also
+// those above 127, what turns the direction of writing, and bytes that are no UTF-8.
+std::string printable(std::string_view text);
 
 // Reads a line from a foreign text, without its line break; false at the end. Of a line longer than
 // LINE_LENGTH only so much is kept, which is more than fits any field: it is refused there, not taken for
