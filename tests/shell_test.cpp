@@ -86,6 +86,8 @@ TEST_F(Shell, QuotedNamesReachTheProgramAsTheyAre)
         }
     }
     EXPECT_EQ(shell_word("daily"), "daily");
+    EXPECT_EQ(shell_word("a+b=c%d^e"), "a+b=c%d^e") << "no shell acts on these";
+    EXPECT_EQ(grep_word("a+b=c%d"), "a+b=c%d");
     EXPECT_FALSE(exists("pwned"));
 }
 
@@ -111,6 +113,7 @@ TEST_F(Shell, WhatCannotBeQuotedIsRefused)
     for (const std::string name :
          {"", ".", "..", "a/b", "a\nb", "a\tb", "a\"b", "a\\b", "a|b", "a<b", "a>b", "a*", "a?"}) {
         EXPECT_FALSE(is_job_name(name)) << name;
+        EXPECT_FALSE(JobName::checked(name)) << name;
     }
     EXPECT_TRUE(is_job_name(std::string(127, 'x')));
     EXPECT_FALSE(is_job_name(std::string(128, 'x')));
@@ -141,4 +144,24 @@ TEST_F(Shell, WhatCannotBeQuotedIsRefused)
     EXPECT_FALSE(is_safe_port("873;x"));
     EXPECT_TRUE(is_base64("x", "cGFrdG8="));
     EXPECT_FALSE(is_base64("x", "a'b"));
+}
+
+// A path that the shell of the remote host reads as it is: also a C shell, which people over there may have.
+TEST_F(Shell, APathIsRefusedOnlyForWhatAShellActsOnWhereItStands)
+{
+    for (const std::string path :
+         {"/v/#recycle", "/v/C#", "/v/a~b", "/v/wow!", "a+b", "100%", "a=b", "x^y", "/v/caf\xc3\xa9"}) {
+        EXPECT_TRUE(is_plain_for_shells("x", path)) << path;
+        for (const char *program : {"sh", "bash", "csh"}) {
+            if (shell(std::string("command -v ") + program).status != 0) continue;
+            const std::string command = "printf '[%s]' " + path + " 2>&1";
+            EXPECT_EQ(shell(std::string(program) + " -c " + in_single_quotes(command)).output,
+                      "[" + path + "]")
+                << program;
+        }
+    }
+    for (const std::string path : {"#recycle", "~root", "=ls", "^a", "%1", "a!b", "a=~root", "a:~root", "-rf",
+                                   "a b", "a$b", "a;b", "a(b", "a'b", "a\nb", "a{b,c}", "a[b]", ""}) {
+        EXPECT_EQ(is_plain_for_shells("x", path), path.empty()) << path;
+    }
 }

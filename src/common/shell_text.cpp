@@ -12,8 +12,10 @@ namespace
 {
 
 constexpr std::size_t JOB_NAME_LENGTH = 127;
-constexpr std::string_view LEFT_TO_THE_SHELL = "\"\\|<>*?"; // by escape_path
-constexpr std::string_view SHELL_SPECIAL = "\"\\|<>*?$`#&(){};[]'!~";
+constexpr std::string_view LEFT_TO_THE_SHELL = "\"\\|<>*?";        // by escape_path
+constexpr std::string_view SHELL_SPECIAL = "\"\\|<>*?$`&(){};[]'"; // anywhere in a word
+constexpr std::string_view SPECIAL_IN_FRONT = "#~=^%";             // of a word, to one shell or another
+constexpr std::string_view ESCAPED_IN_WORD = "$`#&(){};[]' ";
 
 bool refused(const char *field, const char *why)
 {
@@ -26,11 +28,28 @@ bool holds_any(std::string_view text, std::string_view characters)
     return text.find_first_of(characters) != std::string_view::npos;
 }
 
-// `ending` holds the characters that end a name of this kind within rsync's or ssh's own argument.
+bool is_one_word(const char *field, std::string_view text)
+{
+    if (text.starts_with('-')) return refused(field, "begins with an option's dash");
+    return !(holds_control(text) || contains(text, " ")) || refused(field, "blank or control character");
+}
+
+// Names are short and come from people: what is special anywhere is refused everywhere. `ending` holds the
+// characters that end a name of this kind within rsync's or ssh's own argument.
 bool is_safe_name(const char *field, std::string_view name, std::string_view ending)
 {
-    if (!is_plain_for_shells(field, name)) return false;
+    if (!is_one_word(field, name)) return false;
+    if (holds_any(name, SHELL_SPECIAL) || holds_any(name, "#!~")) {
+        return refused(field, "character special to the shell");
+    }
     return !holds_any(name, ending) || refused(field, "character that ends a name");
+}
+
+// A C shell looks for an earlier command behind "!" but at a word's end; others replace "~" behind what looks
+// like an assignment.
+bool is_special_inside(std::string_view path)
+{
+    return path.find('!') < path.size() - 1 || contains(path, "=~") || contains(path, ":~");
 }
 
 std::string with_backslashes(std::string_view text, std::string_view before)
@@ -74,20 +93,21 @@ std::optional<std::string> shell_path_part(const char *field, std::string_view p
 
 bool is_plain_for_shells(const char *field, std::string_view path)
 {
-    if (path.starts_with('-')) return refused(field, "begins with an option's dash");
-    if (holds_control(path) || contains(path, " ")) return refused(field, "blank or control character");
-    return !holds_any(path, SHELL_SPECIAL) || refused(field, "character special to the shell");
+    if (!is_one_word(field, path)) return false;
+    const bool special = holds_any(path, SHELL_SPECIAL) || holds_any(path.substr(0, 1), SPECIAL_IN_FRONT) ||
+                         is_special_inside(path);
+    return !special || refused(field, "character special to the shell");
 }
 
 std::string shell_word(std::string_view job_name)
 {
-    return escape_path(job_name);
+    return with_backslashes(job_name, ESCAPED_IN_WORD);
 }
 
 std::string grep_word(std::string_view job_name)
 {
     const std::string pattern = with_backslashes(job_name, "\\.[]*^$");
-    const bool plain = escape_path(pattern) == pattern && !contains(pattern, "\\");
+    const bool plain = shell_word(pattern) == pattern && !contains(pattern, "\\");
     return plain ? pattern : in_single_quotes(pattern);
 }
 
@@ -113,7 +133,8 @@ bool is_safe_port(std::string_view port)
     if (holds_control(trimmed) || contains(trimmed, " ")) {
         return refused("port", "blank or control character");
     }
-    return !holds_any(trimmed, SHELL_SPECIAL) || refused("port", "character special to the shell");
+    return !(holds_any(trimmed, SHELL_SPECIAL) || holds_any(trimmed, "#!~")) ||
+           refused("port", "character special to the shell");
 }
 
 bool is_base64(const char *field, std::string_view password)

@@ -23,12 +23,12 @@ std::optional<std::string> shell_path_part(const char *field, std::string_view p
 // shell replaces there.
 std::optional<std::string> shell_path(const char *field, std::string_view path);
 
-// Whether a path holds nothing that any shell acts on, blanks included: for commands that the shell of the
-// remote host reads once more, after the escapes are gone.
+// Whether a path holds nothing that any shell acts on where it stands, blanks included: for commands that the
+// shell of the remote host reads once more, after the escapes are gone. "C#" and "a~b" pass, "#C" and "~a" do
+// not.
 bool is_plain_for_shells(const char *field, std::string_view path);
 
-// A job name, or a file name made of one, as part of a word. Only for names that is_job_name accepts, or the
-// empty one.
+// A job name as part of a word that is no path. Only for names that is_job_name accepts, or the empty one.
 std::string shell_word(std::string_view job_name);
 
 // A grep pattern, as part of a word, that matches the job name and nothing else.

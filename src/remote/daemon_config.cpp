@@ -68,8 +68,9 @@ bool read_daemon_config(const std::string &local_copy, const std::function<bool(
 
 bool fetch_daemon_config(const std::string &local_copy)
 {
-    const auto command =
-        ssh_command(CurrentJob, SshLogin::as_client, "cat /etc/rsyncd.conf > " + shell_word(local_copy));
+    const auto word = shell_path("local copy", local_copy);
+    if (!word) return false;
+    const auto command = ssh_command(CurrentJob, SshLogin::as_client, "cat /etc/rsyncd.conf > " + *word);
     if (!command) return false;
     // The shell would write through a link of that name: with a file of ours in place nobody else can put
     // one.

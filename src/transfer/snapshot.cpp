@@ -40,7 +40,7 @@ void run_step(const std::string &command, const std::string &from, const std::st
 std::string rotation_command(const std::string &escaped_folder, const std::string &job_name, int number,
                              int top)
 {
-    const auto word = [&](int n) { return escaped_folder + '/' + shell_word(snapshot_name(job_name, n)); };
+    const auto word = [&](int n) { return escaped_folder + '/' + escape_path(snapshot_name(job_name, n)); };
     if (number == top) return "rm -rf " + word(number);
     return (number == 0 ? "cp -al " : "mv ") + word(number) + ' ' + word(number + 1);
 }
