@@ -2,6 +2,7 @@
 
 #include "common/address.h"
 #include "common/debug_log.h"
+#include "common/excludes.h"
 #include "common/folder_table.h"
 #include "common/shell.h"
 #include "common/shell_text.h"
@@ -20,20 +21,6 @@ namespace
 
 constexpr std::size_t LOCAL_COMMAND_SIZE = 4648;
 constexpr const char *UNKNOWN = "N/A";
-
-// Quoted for two shells: the one here and the one on the remote host.
-constexpr const char *REMOTE_EXCLUDES =
-    R"( --exclude='.AppleDouble' --exclude='.AppleDB'  --exclude='.DS_Store' --exclude='.bin')"
-    R"( --exclude='.AppleDesktop'  --exclude=\''Network Trash Folder'\' --exclude=\''.!@#$recycle'\' )"
-    R"( --exclude='lost+found' --exclude='Nas_Prog' --exclude='Ajaxpf'  --exclude='.systemfile')"
-    R"( --exclude='P2P' --exclude='aMule' --exclude=\''.!@$mmc'\' --exclude=\''.!@#$tarnelSync'\')"
-    R"( --exclude='.zorv' )";
-
-constexpr const char *LOCAL_EXCLUDES =
-    " --exclude='.AppleDouble' --exclude='.AppleDB'  --exclude='.DS_Store' --exclude='.bin'"
-    " --exclude='.AppleDesktop'  --exclude='Network Trash Folder' --exclude='.!@#$recycle' "
-    " --exclude='lost+found' --exclude='Nas_Prog' --exclude='Ajaxpf'  --exclude='.systemfile'"
-    " --exclude='P2P' --exclude='aMule' --exclude='.!@$mmc'  --exclude='.!@#$tarnelSync' --exclude='.zorv' ";
 
 bool is_du_size(std::string_view text)
 {
@@ -57,7 +44,8 @@ std::string du_as_client(const RsyncJob &job, const std::string &folder)
     const AddressKind kind = ip_address_kind(job.remote_ip);
     if (present) {
         const char *const blanks = kind == ADDRESS_IPV6 ? "  " : " ";
-        return format_text("/usr/bin/du -sh %s%s%s 2>&1", REMOTE_EXCLUDES, blanks, folder.c_str());
+        return format_text("/usr/bin/du -sh %s%s%s 2>&1", exclude_options(ExcludeForm::DU_REMOTE).c_str(),
+                           blanks, folder.c_str());
     }
     const bool link_local = kind == ADDRESS_LINK_LOCAL;
     return format_text("du -sh %s%s%s 2>&1", link_local ? " " : "", folder.c_str(), link_local ? "" : " ");
@@ -77,7 +65,7 @@ std::optional<std::string> local_du_command(char *folders)
 {
     FolderTable table{};
     rsync_split_list(folders, ":", table);
-    std::string command = format_text("/usr/bin/du -shc %s ", LOCAL_EXCLUDES);
+    std::string command = format_text("/usr/bin/du -shc %s ", exclude_options(ExcludeForm::DU_HERE).c_str());
     for (int i = 0; i < table.count; ++i) {
         const auto folder = shell_path("local_path", table.entries[i]);
         if (!folder) return std::nullopt;

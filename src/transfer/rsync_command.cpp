@@ -2,6 +2,7 @@
 
 #include "common/address.h"
 #include "common/debug_log.h"
+#include "common/excludes.h"
 #include "common/job_files.h"
 #include "common/private_file.h"
 #include "common/run_options.h"
@@ -16,12 +17,6 @@ namespace bakjob
 
 namespace
 {
-
-constexpr const char *EXCLUDES =
-    " --exclude '.AppleDouble' --exclude '.AppleDB'  --exclude '.DS_Store' --exclude '.bin'"
-    " --exclude '.AppleDesktop'  --exclude 'Network Trash Folder' --exclude '.!@#$recycle' "
-    " --exclude 'lost+found' --exclude 'Nas_Prog' --exclude 'Ajaxpf'  --exclude '.systemfile'"
-    " --exclude 'P2P' --exclude 'aMule' --exclude '.!@$mmc' --exclude '.!@#$tarnelSync' --exclude '.zorv' ";
 
 // Whether what stands in the command unquoted may stand there.
 bool is_safe(const RsyncJob &job)
@@ -71,7 +66,7 @@ std::optional<std::string> options(const RsyncJob &job)
     }
     text += deletion(job.keep_exist_file);
     if (job.rsync_timeout > 0) text += format_text(" --timeout=%d ", job.rsync_timeout);
-    text += EXCLUDES;
+    text += exclude_options(ExcludeForm::TRANSFER);
     if (job.rsync_mode == RSYNC_MODE_DAEMON) {
         if (!shell_path("rsync_pwd_file", job.rsync_pwd_file)) return std::nullopt;
         text += " --password-file=" + in_double_quotes(job.rsync_pwd_file);
