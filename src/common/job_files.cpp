@@ -36,6 +36,11 @@ std::string progress_file(std::string_view job_name)
     return named_after("/tmp/rsync_bakcup_src_folder_name.", job_name);
 }
 
+std::string unrecorded_file(std::string_view job_name)
+{
+    return named_after("/var/run/bakjob_", job_name, ".unrecorded");
+}
+
 std::string transfer_file(std::string_view job_name)
 {
     return named_after("/tmp/r_", job_name);

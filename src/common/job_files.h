@@ -19,6 +19,9 @@ std::string pid_file(std::string_view job_name);
 std::string password_file(std::string_view job_name);
 std::string progress_file(std::string_view job_name);
 
+// How a job stands where the configuration could not be written (cli/unrecorded_state.h).
+std::string unrecorded_file(std::string_view job_name);
+
 // Written by the appliance's rsync: what a transfer has moved, and the sizes that its dry run found.
 std::string transfer_file(std::string_view job_name);
 std::string transfer_size_file(std::string_view job_name);
