@@ -14,7 +14,7 @@ namespace bakjob::ctl
 using Json = nlohmann::ordered_json;
 using Row = std::vector<std::string>;
 
-// The text with what a terminal would act on replaced by '?'.
+// The text with what a terminal would act on, and bytes that are no UTF-8, replaced by '?'.
 std::string printable(std::string_view text);
 
 // The start of the text that fits so many columns.
