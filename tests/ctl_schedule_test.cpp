@@ -39,7 +39,8 @@ class Replacements
 public:
     explicit Replacements(const char *folder) : events_(inotify_init1(IN_NONBLOCK))
     {
-        inotify_add_watch(events_, folder, IN_MOVED_TO);
+        // Events that are the same as the one before are dropped, so every other one is of another kind.
+        inotify_add_watch(events_, folder, IN_MOVED_FROM | IN_MOVED_TO);
     }
     Replacements(const Replacements &) = delete;
     Replacements &operator=(const Replacements &) = delete;
@@ -50,8 +51,9 @@ public:
         alignas(inotify_event) std::array<char, 4096> events{};
         const ssize_t length = read(events_, events.data(), events.size());
         int count = 0;
-        for (ssize_t at = 0; at < length; ++count) {
+        for (ssize_t at = 0; at < length;) {
             const auto *event = reinterpret_cast<const inotify_event *>(events.data() + at); // NOLINT
+            if ((event->mask & IN_MOVED_TO) != 0) ++count;
             at += static_cast<ssize_t>(sizeof *event + event->len);
         }
         return count;
@@ -114,6 +116,7 @@ TEST_F(CtlSchedule, TheSchedulerGoesByTheFileWhenASaveOrTheFlashFails)
         EXPECT_EQ(rsync_delete_job("daily"), 1);
         EXPECT_EQ(read_file(CRON), OF_DAILY) << "the job is still there, and so is its timetable";
     }
+    ASSERT_TRUE(says(ctl("set daily retry=1"), 0, ""));
     fs::remove_all("/var/lib/device_flash");
     write_file("/var/lib/device_flash", "no folder");
     EXPECT_TRUE(says(ctl("schedule daily '9 9 * * *'"), 3, "could not be copied to flash"));
