@@ -5,10 +5,12 @@
 #include "common/shell_text.h"
 #include "common/text.h"
 #include "config/current_job.h"
+#include "config_file.h"
 #include "cron.h"
 #include "failure.h"
 #include "fields.h"
 #include "findings.h"
+#include "scheduler_file.h"
 #include "summary.h"
 #include "transfer/backup.h"
 
@@ -41,6 +43,8 @@ public:
     void values();
     void passwords();
     void schedule(const std::vector<ScheduleEntry> &entries);
+    void taken_over(const std::vector<ScheduleEntry> &entries);
+    void configuration();
     void runs();
     void snapshots();
     void programs();
@@ -140,6 +144,43 @@ void Check::schedule(const std::vector<ScheduleEntry> &entries)
         } catch (const Failure &failure) {
             problem("timetable", failure.what(), "bakjobctl schedule NAME TIMES");
         }
+    }
+    taken_over(entries);
+}
+
+void Check::taken_over(const std::vector<ScheduleEntry> &entries)
+{
+    const auto difference = schedule_difference(job_.job_name);
+    if (!difference) return;
+    if (!difference->missing.empty()) {
+        const std::string times = entries.empty() ? "TIMES" : '"' + times_of(entries.front()) + '"';
+        problem("timetable", "the scheduler has not taken it over: " + difference->missing.front(),
+                "bakjobctl schedule NAME " + times + " hands it over again.");
+    }
+    if (!difference->left_over.empty()) {
+        problem("timetable",
+                "the scheduler still has an entry that is not there any more: " +
+                    difference->left_over.front(),
+                entries.empty() ? "bakjobctl unschedule NAME takes it away."
+                                : "bakjobctl schedule NAME TIMES leaves one.");
+    }
+}
+
+void Check::configuration()
+{
+    const std::string why = why_not_writable();
+    if (!why.empty()) {
+        problem("configuration", "it cannot be written, so no run can record how it ended: " + why,
+                "Make that folder writable, with room for the file twice.");
+    }
+    for (const StateKind kind : {StateKind::BACKUP, StateKind::RESTORE}) {
+        const Standing standing = standing_of(job_, kind);
+        if (standing.recorded) continue;
+        problem("configuration",
+                std::string("it could not be written at the end of a ") +
+                    (kind == StateKind::BACKUP ? "run" : "restore") +
+                    ", and does not say: " + words_of_state(standing.state).words + ", " + standing.time,
+                "The next run that can be recorded clears this.");
     }
 }
 
@@ -259,6 +300,7 @@ void check_here(const RsyncJob &job, const std::vector<ScheduleEntry> &schedule,
     check.values();
     check.passwords();
     check.schedule(schedule);
+    check.configuration();
     check.runs();
     check.snapshots();
     check.programs();

@@ -20,6 +20,8 @@ namespace bakjob::ctl
 namespace
 {
 
+constexpr const char *NO_GREETING = "Change the greeting's first line over there, or take the greeting away.";
+
 // Files of a probe, to be removed however it ends.
 char password_path[PATH_SIZE];
 char config_path[PATH_SIZE];
@@ -83,6 +85,7 @@ private:
     }
     void report(const std::string &about, const Advice &advice, const std::string &line);
     void preparation(const std::string &folder);
+    bool misled(const std::string &folder, const DaemonReply &target);
 
     [[nodiscard]] bool to_module() const { return job_.rsync_mode == RSYNC_MODE_DAEMON; }
 
@@ -118,6 +121,11 @@ bool RemoteCheck::daemon()
     const DaemonReply reply = ask_daemon();
     if (reply.result != REPLY_OK) {
         report("rsync daemon", advice_of_reply(reply.result), reply.line);
+        return false;
+    }
+    if (reply.run_sees != REPLY_OK) {
+        add(Verdict::PROBLEM, "rsync daemon",
+            "answers, but a run takes its greeting for a failure: " + reply.first, NO_GREETING);
         return false;
     }
     add(Verdict::FINE, "rsync daemon", "answers");
@@ -170,6 +178,25 @@ void RemoteCheck::preparation(const std::string &folder)
     }
 }
 
+// Whether a run would act on a folder by what it takes for the truth. It acts on a missing one alone.
+bool RemoteCheck::misled(const std::string &folder, const DaemonReply &target)
+{
+    const bool pushes = job_.backup_type == BACKUP_PUSH;
+    const bool missing = target.result == REPLY_NO_DIR;
+    const bool seen = target.run_sees == REPLY_NO_DIR;
+    if (missing == seen || (pushes && !to_module()) || (missing && !pushes)) return false;
+    const std::string greeting = ": \"" + target.first + '"';
+    if (missing) {
+        add(Verdict::PROBLEM, folder,
+            "is not there yet, and no run makes it, as the greeting hides that" + greeting,
+            "Make this folder there, or take \"motd file\" out of the daemon's configuration.");
+    } else {
+        add(Verdict::PROBLEM, folder, "a run takes it for missing because of the greeting" + greeting,
+            NO_GREETING);
+    }
+    return true;
+}
+
 void RemoteCheck::folder(const std::string &folder)
 {
     RsyncJob ended = probe_.job();
@@ -177,14 +204,16 @@ void RemoteCheck::folder(const std::string &folder)
     if (!found || !copy_text(ended.local_path, folder) || !rsync_set_ends(ended, folder)) return;
     copy_text(CurrentJob.remote_path, ended.remote_path);
     const DaemonReply target = look_for_target();
-    if (target.result == REPLY_NO_DIR && job_.backup_type != BACKUP_PUSH) {
+    const bool pushes = job_.backup_type == BACKUP_PUSH;
+    if (misled(folder, target)) return;
+    if (target.result == REPLY_NO_DIR && !pushes) {
         report(folder, {"is not there", "A pull fetches what lies in the folder of this name over there."},
                target.line);
     } else if (target.result == REPLY_NO_DIR && to_module()) {
         preparation(folder);
     } else {
         DaemonReply transfer = try_transfer(ended);
-        if (transfer.result == REPLY_OK && job_.backup_type == BACKUP_PUSH && !to_module()) {
+        if (transfer.result == REPLY_OK && pushes && !to_module()) {
             // The dry run of a folder does not say that its parent is missing; that of a file does.
             copy_text(ended.local_path, "/etc/hosts");
             transfer = try_transfer(ended);

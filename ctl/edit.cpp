@@ -1,15 +1,21 @@
 // add, set, delete, enable, disable, schedule, unschedule: whatever changes the configuration.
 
 #include "commands.h"
+#include "common/job_files.h"
 #include "common/shell_text.h"
+#include "config/config_lock.h"
 #include "config/job_list.h"
 #include "config/schedule.h"
 #include "cron.h"
 #include "failure.h"
 #include "fields.h"
 #include "jobs.h"
+#include "scheduler_file.h"
 #include "secret.h"
 #include "summary.h"
+
+#include <cstdio>
+#include <unistd.h>
 
 namespace bakjob::ctl
 {
@@ -43,10 +49,41 @@ int set_enable(const Request &request, int enable)
     return EXIT_FINE;
 }
 
-void apply_schedule()
+// One at a time, or the last to write may be one who read before the others' saves.
+bool hand_over()
 {
-    if (rsync_apply_schedule() == 0) {
-        throw Failure("the configuration is changed, but the scheduler did not take it over");
+    const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
+    return rsync_apply_schedule() == 1;
+}
+
+// A change of a job that changes its timetable, too: saved at once, and then handed over to the scheduler.
+// Whether that took it.
+bool change_timetable(const std::string &name, const std::function<void(RsyncJob &)> &change)
+{
+    bool changed = false;
+    try {
+        change_job(name, [&](RsyncJob &job) {
+            change(job);
+            changed = true;
+        });
+    } catch (const Failure &failure) {
+        // Saved or not: the scheduler goes by what the file says now.
+        if (!changed || hand_over()) throw;
+        throw Failure(std::string(failure.what()) + "; and the scheduler did not take over what it says");
+    }
+    return hand_over();
+}
+
+// What a job left where its next run would look: passwords among it. Copies and snapshots are people's.
+void remove_files_of(const std::string &name)
+{
+    const auto job = JobName::checked(name);
+    if (!job) return;                          // no run can have had it
+    if (run_of(name) == Run::GOING_ON) return; // of a job that was added meanwhile
+    for (const std::string &path :
+         {password_file(*job), progress_file(*job), transfer_file(*job), transfer_size_file(*job),
+          remote_config_copy(*job), unrecorded_file(*job)}) {
+        std::remove(path.c_str());
     }
 }
 
@@ -64,7 +101,8 @@ std::string run_command(const std::string &name)
 
 int add_job(const Request &request)
 {
-    if (!is_job_name(request.name)) {
+    const auto name = JobName::checked(request.name);
+    if (!name) {
         throw Failure(
             "\"" + request.name +
             "\" is not allowed as a job's name; allowed: up to 127 bytes without / \" \\ | < > * ? and "
@@ -79,6 +117,8 @@ int add_job(const Request &request)
         }
         if (rsync_list_add_job(job) == 0) throw Failure("no memory");
     });
+    // Of an earlier job of this name.
+    unlink(unrecorded_file(*name).c_str());
     return EXIT_FINE;
 }
 
@@ -95,14 +135,18 @@ int set_job(const Request &request)
 
 int delete_job(const Request &request)
 {
-    change_job(request.name, [&](RsyncJob &job) {
+    const bool taken_over = change_timetable(request.name, [&](RsyncJob &job) {
         if (run_of(request.name) == Run::GOING_ON) {
             throw Failure("a run of it is going on; bakjob -k " + name_for_shell(request.name) + " ends it");
         }
         rsync_unschedule_job(request.name);
         rsync_list_remove_job(&job);
     });
-    apply_schedule();
+    remove_files_of(request.name);
+    if (!taken_over) {
+        throw Failure("the job is deleted, but the scheduler did not take that over and goes on starting "
+                      "runs, which are refused; bakjobctl schedule of any other job hands that over, too");
+    }
     return EXIT_FINE;
 }
 
@@ -121,24 +165,33 @@ int schedule_job(const Request &request)
     const auto times = parse_cron_times(request.times);
     const std::string run = run_command(request.name);
     if (run.size() > LONGEST_COMMAND) throw Failure("the job's name is too long for the scheduler");
-    change_job(request.name, [&](RsyncJob &job) {
+    const ScheduleEntry entry{times[0], times[1], times[2], times[3], times[4], "root", run};
+    const bool taken_over = change_timetable(request.name, [&](RsyncJob &job) {
         rsync_unschedule_job(request.name);
-        const int created = rsync_create_schedule(times[0].c_str(), times[1].c_str(), times[2].c_str(),
-                                                  times[3].c_str(), times[4].c_str(), "root", run.c_str());
-        if (created == 0) {
-            throw Failure("the scheduler did not take the entry over; bakjobctl show tells what it is to do");
+        if (!rsync_add_schedule(entry)) {
+            throw Failure("the configuration does not take the entry: there are too many, or more than their "
+                          "count says; nothing is changed");
         }
         job.schedule_mode = SCHEDULE_TIMETABLE;
     });
+    if (!taken_over) {
+        throw Failure("the timetable is in the configuration, but the scheduler did not take it over, so "
+                      "nothing runs by it yet; the same command again hands it over");
+    }
     return EXIT_FINE;
 }
 
 int unschedule_job(const Request &request)
 {
-    change_job(request.name, [&](RsyncJob &) {
-        if (rsync_unschedule_job(request.name) == 0) throw Failure("the job has no timetable");
+    const auto difference = schedule_difference(request.name);
+    const bool left_over = difference && !difference->left_over.empty();
+    const bool taken_over = change_timetable(request.name, [&](RsyncJob &) {
+        if (rsync_unschedule_job(request.name) == 0 && !left_over) throw Failure("the job has no timetable");
     });
-    apply_schedule();
+    if (!taken_over) {
+        throw Failure("the timetable is no longer in the configuration, but the scheduler did not take that "
+                      "over and goes on running by it; the same command again hands it over");
+    }
     return EXIT_FINE;
 }
 

@@ -13,19 +13,23 @@
 namespace bakjob::ctl
 {
 
-// A run goes on when it does not know a reply's first line, and then fails in its transfer. Here the
-// command's exit status counts, too: what fails is never taken for OK.
-template <class Result>
-struct Reply {
-    Result result;
-    std::string line; // the first one
+// Of an ssh login, by its first line and the command's exit status. No result: the host's key has changed,
+// and is left as it is.
+struct LoginReply {
+    std::optional<SshTestResult> result;
+    std::string line;
 };
-
-// Of an ssh login; no result: the host's key has changed, and is left as it is.
-using LoginReply = Reply<std::optional<SshTestResult>>;
 LoginReply try_login(SshLogin login);
 
-using DaemonReply = Reply<RemoteReplyCode>;
+// A run judges a reply of rsync by its first line alone, which is the daemon's greeting where it has one, and
+// goes on when it does not know it. What is true takes the whole reply and the command's exit status: what
+// fails is never taken for OK.
+struct DaemonReply {
+    RemoteReplyCode result;   // what is true
+    std::string line;         // by which line of the reply
+    RemoteReplyCode run_sees; // what a run takes it for
+    std::string first;        // by this line
+};
 DaemonReply ask_daemon(); // for its modules
 DaemonReply ask_port();   // the same, at the job's own port
 

@@ -12,22 +12,42 @@ namespace bakjob::ctl
 namespace
 {
 
-// A state that claims a run is only believed when there is one.
-void judge(Summary &summary, const RsyncJob &job)
+std::string note_on(const Standing &standing)
 {
-    const StateWords state = words_of_state(job.state);
-    summary.last = state.words;
-    summary.outcome = state.outcome;
+    return standing.recorded ? "" : ", not recorded: the configuration could not be written";
+}
+
+std::string words_of(const Standing &standing)
+{
+    return words_of_state(standing.state).words + note_on(standing);
+}
+
+// A state that claims a run is only believed when there is one.
+void judge(Summary &summary, const Standing &standing)
+{
+    summary.last = words_of(standing);
+    summary.time = standing.time;
+    summary.outcome = words_of_state(standing.state).outcome;
+    const bool claims_run = summary.outcome == Outcome::RUNNING;
     if (summary.run == Run::GOING_ON) {
         summary.outcome = Outcome::RUNNING;
     } else if (summary.run == Run::LEFT_BEHIND) {
         summary.outcome = Outcome::FAILED;
         summary.last = "died in a run";
-    } else if (state.outcome == Outcome::RUNNING) {
+    } else if (claims_run) {
         summary.outcome = Outcome::FAILED;
-        summary.last = "interrupted";
+        summary.last = "interrupted" + note_on(standing);
     }
     if (!summary.enabled && summary.outcome == Outcome::FAILED) summary.outcome = Outcome::FINE;
+}
+
+void judge_restore(Summary &summary, const Standing &standing)
+{
+    const bool restored = standing.state != JOB_IDLE && standing.state != -1;
+    summary.restore_outcome = words_of_state(standing.state).outcome;
+    if (!restored) return;
+    summary.restore = words_of(standing);
+    summary.restore_time = standing.time;
 }
 
 } // namespace
@@ -44,10 +64,18 @@ std::string times_of(const ScheduleEntry &entry)
     return entry.minute + ' ' + entry.hour + ' ' + entry.day + ' ' + entry.month + ' ' + entry.weekday;
 }
 
+Standing standing_of(const RsyncJob &job, StateKind kind)
+{
+    const auto name = JobName::checked(job.job_name);
+    const auto unrecorded = name ? rsync_unrecorded_state(*name, kind) : std::nullopt;
+    if (unrecorded) return {unrecorded->state, unrecorded->time, false};
+    if (kind == StateKind::RESTORE) return {job.rstate, job.rlast_do_job_time, true};
+    return {job.state, job.last_do_job_time, true};
+}
+
 Summary summary_of(const StoredJob &job)
 {
     const RsyncJob &record = job.record;
-    const bool restored = record.rstate != JOB_IDLE && record.rstate != -1;
     Summary summary{.name = record.job_name,
                     .direction = word_of("backup_type", record.backup_type),
                     .remote = record.remote_ip,
@@ -55,15 +83,17 @@ Summary summary_of(const StoredJob &job)
                     .run = run_of(record.job_name),
                     .outcome = Outcome::FINE,
                     .last = {},
-                    .time = record.last_do_job_time,
-                    .restore = restored ? words_of_state(record.rstate).words : "",
-                    .restore_time = restored ? record.rlast_do_job_time : "",
+                    .time = {},
+                    .restore = {},
+                    .restore_time = {},
+                    .restore_outcome = Outcome::FINE,
                     .schedule = job.schedule.empty() ? "" : times_of(job.schedule.front())};
     const bool brackets = ip_address_kind(record.remote_ip) != ADDRESS_IPV4;
     if (brackets) summary.remote = '[' + summary.remote + ']';
     summary.remote += record.rsync_mode == RSYNC_MODE_DAEMON ? "::" : ":";
     summary.remote += record.remote_path;
-    judge(summary, record);
+    judge(summary, standing_of(record, StateKind::BACKUP));
+    judge_restore(summary, standing_of(record, StateKind::RESTORE));
     return summary;
 }
 

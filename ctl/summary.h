@@ -2,10 +2,12 @@
 
 // Where a job stands, in short: what list, show, status and watch tell.
 
+#include "cli/unrecorded_state.h"
 #include "jobs.h"
 #include "output.h"
 #include "words.h"
 
+#include <cstdint>
 #include <string>
 
 namespace bakjob::ctl
@@ -19,6 +21,16 @@ enum class Run {
 
 Run run_of(const std::string &name);
 
+// How the backup or the restore of a job stands: as recorded, or else as the module has kept it where the
+// configuration could not be written.
+struct Standing {
+    std::int32_t state;
+    std::string time;
+    bool recorded;
+};
+
+Standing standing_of(const RsyncJob &job, StateKind kind);
+
 struct Summary {
     std::string name;
     std::string direction;
@@ -30,6 +42,7 @@ struct Summary {
     std::string time;    // when that was recorded, empty for a job that never ran
     std::string restore; // how the last restore ended, empty when there was none; it is not judged
     std::string restore_time;
+    Outcome restore_outcome;
     std::string schedule; // in cron's notation, empty for none
 };
 

@@ -209,7 +209,8 @@ bool follow(const std::string &name, bool json)
     while (run_of(name) == Run::GOING_ON) {
         if (checked) teller.tell(read_progress(*checked));
         if (Clock::now() >= next_look) {
-            restore = rsync_state_is_running(read_job(name).record.rstate) == 1;
+            const Standing standing = standing_of(read_job(name).record, StateKind::RESTORE);
+            restore = rsync_state_is_running(standing.state) == 1;
             next_look = Clock::now() + std::chrono::seconds(1);
         }
         std::this_thread::sleep_for(LOOK_EVERY);
@@ -224,8 +225,7 @@ int watch_job(const Request &request)
     read_job(request.name);
     const bool ran = wait_for_start(request.name);
     const bool restore = ran && follow(request.name, request.json);
-    const StoredJob job = read_job(request.name);
-    const Summary summary = summary_of(job);
+    const Summary summary = summary_of(read_job(request.name));
     if (request.json) {
         print_json(json_of(summary), -1);
     } else {
@@ -234,7 +234,7 @@ int watch_job(const Request &request)
                     (restore ? "restore " + summary.restore : summary.last).c_str(),
                     (restore ? summary.restore_time : summary.time).c_str());
     }
-    const Outcome outcome = restore ? words_of_state(job.record.rstate).outcome : summary.outcome;
+    const Outcome outcome = restore ? summary.restore_outcome : summary.outcome;
     return outcome == Outcome::FAILED ? EXIT_TROUBLE : EXIT_FINE;
 }
 

@@ -1,6 +1,6 @@
 // bakjobctl as people and monitoring systems call it.
 
-#include "support.h"
+#include "ctl_support.h"
 
 #include <algorithm>
 #include <csignal>
@@ -12,46 +12,6 @@ namespace fs = std::filesystem;
 
 namespace
 {
-
-constexpr const char *STORE = "/etc/NAS_CFG/config.xml";
-constexpr const char *FLASH = "/var/lib/device_flash/config.xml";
-constexpr const char *CRON = "/etc/cron.d/device_scheduler";
-
-Ran ctl(const std::string &arguments)
-{
-    return shell("/usr/sbin/bakjobctl " + arguments + " 2>&1");
-}
-
-// Tells what the program said when it does not say that.
-testing::AssertionResult says(const Ran &ran, int status, const std::string &text)
-{
-    if (ran.status == status && ran.output.find(text) != std::string::npos)
-        return testing::AssertionSuccess();
-    return testing::AssertionFailure()
-           << "exit status " << ran.status << ": " << ran.output << "instead of " << status << ": " << text;
-}
-
-class Ctl : public Appliance
-{
-protected:
-    void SetUp() override
-    {
-        Appliance::SetUp();
-        add_share("Public", "/mnt/HD/HD_a2/Public");
-        write_file("/mnt/HD/HD_a2/Public/a", "a");
-        write_file("/tmp/kv_serial.txt", "S123");
-        shell("rm -f ~root/.ssh/known_hosts");
-    }
-
-    // Passwords "secret" and "rootpw", as the remote side takes them.
-    static Ran add(const std::string &name, const std::string &more = "")
-    {
-        return shell("printf 'secret\nrootpw\n' | /usr/sbin/bakjobctl add " + name +
-                     " remote_ip=127.0.0.1 remote_path=backup local_path=/mnt/HD/HD_a2/Public rsync_user=bk "
-                     "rsync_pwd=- ssh_pwd=- retry=0 " +
-                     more + " 2>&1");
-    }
-};
 
 TEST_F(Ctl, AnAddedJobRunsAndNothingShowsItsPasswords)
 {

@@ -56,6 +56,7 @@ TEST_F(Schedule, PruningKeepsExactlyTheEntriesThatNameAJob)
         std::string groups;
         bool committed;
     };
+    const std::string filler(300, 'x');
     const std::string all_groups = "3:first,rsync,last";
     const std::string no_group = "2:first,last,(none)";
     const std::vector<Case> cases = {
@@ -66,12 +67,13 @@ TEST_F(Schedule, PruningKeepsExactlyTheEntriesThatNameAJob)
         {{"ab"}, {"-r 'abc'", "-r 'ab'"}, "-r 'ab'|", all_groups, true},
         {{long_name}, {"-r '" + long_name + "'", "-r 'x'"}, "-r '" + long_name + "'|", all_groups, true},
         {{"a"}, {}, "", all_groups, false},
-        // Longer than what is read of it: not judged.
+        // However long.
         {{"a"},
-         {std::string(255, 'x'), std::string(300, 'x') + "'a'", "-r 'b'"},
-         std::string(300, 'x') + "'a'|",
+         {std::string(255, 'x'), filler + "'a'", filler + "'b'", filler + filler + "'" + filler, "-r 'b'"},
+         filler + "'a'|",
          all_groups,
-         true}};
+         true},
+        {{"a"}, {filler + "'b'"}, "", no_group, true}};
     for (const Case &one : cases) {
         SetUp();
         set_entries(one.commands);
@@ -83,6 +85,16 @@ TEST_F(Schedule, PruningKeepsExactlyTheEntriesThatNameAJob)
         EXPECT_EQ(groups(), one.groups);
         EXPECT_EQ(committed(), one.committed) << one.left;
     }
+}
+
+TEST_F(Schedule, ACommandTooLongToBeJudgedStays)
+{
+    set_entries({std::string(1U << 20U, '\''), "-r 'b'"});
+    rsync_load_jobs();
+    rsync_list_add_job(make_job("a"));
+    rsync_save_jobs();
+    EXPECT_EQ(store_get("/system_mgr/crond/rsync/count"), "1");
+    EXPECT_EQ(store_get("/system_mgr/crond/rsync/item:1/run").substr(0, 3), "'''");
 }
 
 TEST_F(Schedule, RemovingAJobsEntryTakesTheFirstThatHoldsItsName)

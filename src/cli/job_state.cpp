@@ -1,6 +1,8 @@
 #include "cli/job_state.h"
 
 #include "cli/process_guard.h"
+#include "cli/unrecorded_state.h"
+#include "common/debug_log.h"
 #include "common/job_files.h"
 #include "common/run_options.h"
 #include "common/text.h"
@@ -9,7 +11,11 @@
 #include "config/job_store.h"
 #include "platform/device.h"
 
+#include <cerrno>
+#include <cstring>
 #include <ctime>
+#include <utility>
+#include <vector>
 
 namespace bakjob
 {
@@ -17,10 +23,27 @@ namespace bakjob
 namespace
 {
 
-void save_and_commit()
+// Whether the configuration has taken the states.
+bool save_and_commit()
 {
-    rsync_save_jobs();
+    const bool saved = rsync_save_jobs();
     LIB_CP_Config_To_MTD(1);
+    return saved;
+}
+
+// A state that is lost would leave the one before it to be believed.
+void keep_unrecorded(const std::string &job_name, StateKind kind, const UnrecordedState &state)
+{
+    DebugLog("ERROR: state %d of [%s] is not recorded: the configuration could not be written\n", state.state,
+             job_name.c_str());
+    const auto name = JobName::checked(job_name);
+    if (!name || rsync_keep_unrecorded(*name, kind, state)) return;
+    DebugLog("ERROR: [%s]: %s\n", unrecorded_file(*name).c_str(), std::strerror(errno));
+}
+
+void forget_unrecorded(const std::string &job_name, StateKind kind)
+{
+    if (const auto name = JobName::checked(job_name)) rsync_forget_unrecorded(*name, kind);
 }
 
 bool reset_if_stale(std::int32_t &state, char (&time)[JOB_TIME_SIZE], const char *now)
@@ -55,14 +78,17 @@ void rsync_set_job_state(const std::string &job_name, JobState state)
         rsync_free_jobs();
         return;
     }
-    if (run_options.restore_mode != 0) {
-        job->rstate = state;
-        rsync_job_time(job->rlast_do_job_time);
+    const bool restore = run_options.restore_mode != 0;
+    (restore ? job->rstate : job->state) = state;
+    auto &time = restore ? job->rlast_do_job_time : job->last_do_job_time;
+    rsync_job_time(time);
+    const UnrecordedState as_set{state, time}; // the save frees the job
+    const StateKind kind = restore ? StateKind::RESTORE : StateKind::BACKUP;
+    if (save_and_commit()) {
+        forget_unrecorded(job_name, kind);
     } else {
-        job->state = state;
-        rsync_job_time(job->last_do_job_time);
+        keep_unrecorded(job_name, kind, as_set);
     }
-    save_and_commit();
 }
 
 void rsync_reset_stale_states()
@@ -71,18 +97,26 @@ void rsync_reset_stale_states()
     rsync_load_jobs();
     char now[JOB_TIME_SIZE] = "";
     rsync_job_time(now);
-    bool changed = false;
+    std::vector<std::pair<std::string, StateKind>> changed;
     for (RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
         // A name that no run can have has no pid file either.
         const auto name = JobName::checked(job->job_name);
         if (name && !rsync_pid_file_absent(*name)) continue;
-        changed |= reset_if_stale(job->state, job->last_do_job_time, now);
-        changed |= reset_if_stale(job->rstate, job->rlast_do_job_time, now);
+        if (reset_if_stale(job->state, job->last_do_job_time, now)) {
+            changed.emplace_back(job->job_name, StateKind::BACKUP);
+        }
+        if (reset_if_stale(job->rstate, job->rlast_do_job_time, now)) {
+            changed.emplace_back(job->job_name, StateKind::RESTORE);
+        }
     }
-    if (changed) {
-        save_and_commit();
-    } else {
+    if (changed.empty()) {
         rsync_free_jobs();
+    } else if (save_and_commit()) {
+        for (const auto &[job_name, kind] : changed) {
+            forget_unrecorded(job_name, kind);
+        }
+    } else {
+        DebugLog("ERROR: stale states are not reset: the configuration could not be written\n");
     }
 }
 

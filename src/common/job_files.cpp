@@ -36,6 +36,11 @@ std::string progress_file(const JobName &job)
     return named_after("/tmp/rsync_bakcup_src_folder_name.", job.text());
 }
 
+std::string unrecorded_file(const JobName &job)
+{
+    return named_after("/var/run/bakjob_", job.text(), ".unrecorded");
+}
+
 std::string transfer_file(const JobName &job)
 {
     return named_after("/tmp/r_", job.text());

@@ -21,6 +21,9 @@ std::string pid_file(const JobName &job);
 std::string password_file(const JobName &job);
 std::string progress_file(const JobName &job);
 
+// How a job stands where the configuration could not be written (cli/unrecorded_state.h).
+std::string unrecorded_file(const JobName &job);
+
 // Written by the appliance's rsync: what a transfer has moved, and the sizes that its dry run found.
 std::string transfer_file(const JobName &job);
 std::string transfer_size_file(const JobName &job);

@@ -23,7 +23,6 @@ namespace
 
 constexpr const char *JOBS = "/backup_mgr/rsync";
 constexpr const char *JOB_COUNT = "/backup_mgr/rsync/count";
-constexpr std::size_t LONGEST_TEXT = 1U << 20U; // bytes that a save brings back
 
 // The path of one key of one item; reused from key to key, as there are tens of thousands of them.
 class ItemPath
@@ -45,17 +44,6 @@ private:
 // Texts that did not fit their field, by job and key, from the load to the save: the job cannot use them, but
 // a save for another job's sake must not lose them.
 std::map<std::pair<std::string, std::string>, std::string> uncut_texts;
-
-std::string whole_text(const char *path)
-{
-    std::string text;
-    std::size_t size = 4096;
-    do {
-        size *= 4;
-        text = store_text(path, size);
-    } while (text.size() == size - 1 && size < LONGEST_TEXT);
-    return text;
-}
 
 const char *text_to_save(const RsyncJob &job, const JobField &field)
 {
@@ -142,9 +130,12 @@ bool rsync_save_jobs()
     for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
         save_job(*job, ++item);
     }
-    rsync_prune_schedule();
+    const bool handed_over = rsync_prune_schedule();
     rsync_free_jobs(); // before the write, which can use their memory
-    return xml_write_file(CONFIG_FILE) >= 0;
+    if (xml_write_file(CONFIG_FILE) >= 0) return true;
+    // The scheduler is not to go by what the file does not say.
+    if (handed_over) rsync_apply_schedule();
+    return false;
 }
 
 } // namespace bakjob

@@ -6,6 +6,8 @@
 #include "config/store_text.h"
 #include "platform/scheduler.h"
 
+#include <algorithm>
+#include <array>
 #include <unordered_set>
 
 namespace bakjob
@@ -18,8 +20,21 @@ constexpr const char *GROUP = "rsync";
 constexpr const char *GROUP_NODE = "/system_mgr/crond/rsync";
 constexpr const char *ENTRY_COUNT = "/system_mgr/crond/rsync/count";
 constexpr const char *GROUP_COUNT = "/system_mgr/crond/list/count";
+constexpr std::size_t LONGEST_NAME = sizeof(RsyncJob::job_name) - 1;
 constexpr std::size_t TEXT_SIZE = 256; // bytes of a group's name and of a command, terminator included
 constexpr int MOST_ENTRIES = 10'000;
+
+struct EntryKey {
+    const char *key;
+    std::string ScheduleEntry::*text;
+};
+
+constexpr std::array ENTRY_KEYS = {
+    EntryKey{"minute", &ScheduleEntry::minute},   EntryKey{"hour", &ScheduleEntry::hour},
+    EntryKey{"day", &ScheduleEntry::day},         EntryKey{"month", &ScheduleEntry::month},
+    EntryKey{"weekday", &ScheduleEntry::weekday}, EntryKey{"user", &ScheduleEntry::user},
+    EntryKey{"run", &ScheduleEntry::run},
+};
 
 struct Group {
     int groups;            // number of groups that the scheduler has
@@ -35,11 +50,16 @@ int bounded_count(const char *path)
     return 0;
 }
 
+std::string group_name_path(int group)
+{
+    return format_text("/system_mgr/crond/list/name:%d", group);
+}
+
 Group find_group()
 {
     Group group{bounded_count(GROUP_COUNT), {}};
     for (int i = 1; i <= group.groups; ++i) {
-        std::string path = format_text("/system_mgr/crond/list/name:%d", i);
+        std::string path = group_name_path(i);
         if (store_text(path, TEXT_SIZE) == GROUP) {
             group.name_path = std::move(path);
             break;
@@ -48,25 +68,65 @@ Group find_group()
     return group;
 }
 
+std::string entry_path(const std::string &group_node, int entry)
+{
+    return format_text("%s/item:%d", group_node.c_str(), entry);
+}
+
 std::string entry_path(int entry)
 {
-    return format_text("%s/item:%d", GROUP_NODE, entry);
+    return entry_path(GROUP_NODE, entry);
 }
 
-std::string entry_text(int entry, const char *key)
-{
-    return store_text(entry_path(entry) + '/' + key, TEXT_SIZE + 1);
-}
-
+// The start of the command, which is all of an ordinary one.
 std::string entry_command(int entry)
 {
-    return entry_text(entry, "run");
+    return store_text(entry_path(entry) + "/run", TEXT_SIZE + 1);
+}
+
+// Texts are short, and room for a long one costs time.
+std::string text_at(const std::string &path)
+{
+    std::string text = store_text(path, TEXT_SIZE + 1);
+    return text.size() < TEXT_SIZE ? text : whole_text(path);
+}
+
+std::string whole_entry_command(int entry)
+{
+    return text_at(entry_path(entry) + "/run");
+}
+
+ScheduleEntry read_entry(const std::string &path)
+{
+    ScheduleEntry entry;
+    for (const EntryKey &key : ENTRY_KEYS) {
+        entry.*key.text = text_at(path + '/' + key.key);
+    }
+    return entry;
+}
+
+bool write_entry(const std::string &path, const ScheduleEntry &entry)
+{
+    return std::all_of(ENTRY_KEYS.begin(), ENTRY_KEYS.end(), [&](const EntryKey &key) {
+        return set_store_text(path + '/' + key.key, entry.*key.text);
+    });
 }
 
 void delete_entry(int entry, int entries_left)
 {
     xml_del(entry_path(entry).c_str());
     store_decimal(ENTRY_COUNT, entries_left);
+}
+
+bool has_node(const std::string &path)
+{
+    char start[2] = "";
+    return xml_get_str(path.c_str(), sizeof start, start) >= 0;
+}
+
+bool list_group(int number)
+{
+    return set_store_text(group_name_path(number), GROUP) && store_decimal(GROUP_COUNT, number);
 }
 
 void delete_group(const Group &group)
@@ -92,9 +152,9 @@ Names listed_names()
 bool names_one_of(const Names &names, std::string_view command)
 {
     for (std::size_t open = command.find('\''); open < command.size(); open = command.find('\'', open + 1)) {
-        std::size_t close = command.find('\'', open + 1);
-        for (; close < command.size(); close = command.find('\'', close + 1)) {
-            if (names.contains(command.substr(open + 1, close - open - 1))) return true;
+        const std::string_view rest = command.substr(open + 1, LONGEST_NAME + 1);
+        for (std::size_t close = rest.find('\''); close < rest.size(); close = rest.find('\'', close + 1)) {
+            if (names.contains(rest.substr(0, close))) return true;
         }
     }
     return false;
@@ -103,16 +163,6 @@ bool names_one_of(const Names &names, std::string_view command)
 bool names(std::string_view command, std::string_view job_name)
 {
     return contains(command, '\'' + std::string(job_name) + '\'');
-}
-
-bool belongs_to(const std::string &command, std::string_view job_name)
-{
-    if (!names(command, job_name)) return false;
-    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
-        const std::string_view other = job->job_name;
-        if (other.size() > job_name.size() && names(command, other)) return false;
-    }
-    return true;
 }
 
 // Deletes the entries whose command `goes`; how many. The last one takes the group along.
@@ -125,7 +175,7 @@ int delete_entries(const Goes &goes)
     int remaining = entries;
     int entry = 1; // the entries behind a deleted one move up to its number
     for (int visited = 0; visited < entries; ++visited) {
-        if (!goes(entry_command(entry))) {
+        if (!goes(whole_entry_command(entry))) {
             ++entry;
         } else if (remaining == 1) {
             delete_group(group);
@@ -152,14 +202,24 @@ int rsync_schedule_names_job(std::string_view command)
     return names_one_of(listed_names(), command) ? 1 : 0;
 }
 
-// A command that is longer than what is read of it may have been cut before the name, so it is not judged.
-void rsync_prune_schedule()
+// A command that was cut may name a job behind the cut, so it is not judged.
+bool rsync_prune_schedule()
 {
     const Names listed = listed_names();
-    const int deleted = delete_entries([&](const std::string &command) {
-        return command.size() != TEXT_SIZE && !names_one_of(listed, command);
-    });
+    const int deleted = delete_entries(
+        [&](const std::string &command) { return !is_cut(command) && !names_one_of(listed, command); });
     if (deleted > 0) LIB_do_ctc();
+    return deleted > 0;
+}
+
+bool rsync_schedules_job(std::string_view command, std::string_view job_name)
+{
+    if (!names(command, job_name)) return false;
+    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+        const std::string_view other = job->job_name;
+        if (other.size() > job_name.size() && names(command, other)) return false;
+    }
+    return true;
 }
 
 std::vector<ScheduleEntry> rsync_job_schedule(std::string_view job_name)
@@ -167,18 +227,44 @@ std::vector<ScheduleEntry> rsync_job_schedule(std::string_view job_name)
     std::vector<ScheduleEntry> found;
     const int entries = find_group().name_path.empty() ? 0 : bounded_count(ENTRY_COUNT);
     for (int entry = 1; entry <= entries; ++entry) {
-        const std::string command = entry_command(entry);
-        if (!belongs_to(command, job_name)) continue;
-        const auto text = [&](const char *key) { return entry_text(entry, key); };
-        found.push_back({text("minute"), text("hour"), text("day"), text("month"), text("weekday"),
-                         text("user"), command});
+        if (rsync_schedules_job(whole_entry_command(entry), job_name))
+            found.push_back(read_entry(entry_path(entry)));
     }
     return found;
 }
 
+std::vector<ScheduleEntry> rsync_all_schedules()
+{
+    std::vector<ScheduleEntry> all;
+    const int groups = bounded_count(GROUP_COUNT);
+    for (int group = 1; group <= groups; ++group) {
+        const std::string node = "/system_mgr/crond/" + store_text(group_name_path(group), TEXT_SIZE);
+        const int entries = bounded_count((node + "/count").c_str());
+        for (int entry = 1; entry <= entries; ++entry) {
+            all.push_back(read_entry(entry_path(node, entry)));
+        }
+    }
+    return all;
+}
+
+bool rsync_add_schedule(const ScheduleEntry &entry)
+{
+    const Group group = find_group();
+    const int groups = std::max(xml_get_int(GROUP_COUNT), 0);
+    const int entries = std::max(xml_get_int(ENTRY_COUNT), 0);
+    const std::string path = entry_path(entries + 1);
+    if (std::max(groups, entries) >= MOST_ENTRIES) return false;
+    if (has_node(path)) return false;
+    if (group.name_path.empty() && has_node(group_name_path(groups + 1))) return false;
+    const bool added = write_entry(path, entry) && (!group.name_path.empty() || list_group(groups + 1)) &&
+                       store_decimal(ENTRY_COUNT, entries + 1);
+    if (!added) xml_del(path.c_str());
+    return added;
+}
+
 int rsync_unschedule_job(std::string_view job_name)
 {
-    return delete_entries([&](const std::string &command) { return belongs_to(command, job_name); });
+    return delete_entries([&](const std::string &command) { return rsync_schedules_job(command, job_name); });
 }
 
 void rsync_remove_job_schedule(const char *job_name)

@@ -23,9 +23,20 @@ std::vector<ScheduleEntry> rsync_job_schedule(std::string_view job_name);
 // scheduler's to take over by rsync_apply_schedule.
 int rsync_unschedule_job(std::string_view job_name);
 
+// Whether an entry with this command is one of them.
+bool rsync_schedules_job(std::string_view command, std::string_view job_name);
+
+// Every entry of the scheduler, those of other groups than the backup jobs' as well.
+std::vector<ScheduleEntry> rsync_all_schedules();
+
+// Adds an entry, for the caller to save and hand over as above. False, and nothing added, when the store does
+// not take it, or has more entries than their count says, one of which it would replace.
+bool rsync_add_schedule(const ScheduleEntry &entry);
+
 // Deletes the entries that name no job of the job list; the last one left takes the group with it. Does not
-// write the configuration file: the save that it is part of does.
-void rsync_prune_schedule();
+// write the configuration file: the save that it is part of does. Whether anything was deleted, and with that
+// the scheduler told.
+bool rsync_prune_schedule();
 
 // 1 when the command holds the name of a job of the list in single quotes, else 0.
 int rsync_schedule_names_job(std::string_view command);

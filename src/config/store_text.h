@@ -19,9 +19,36 @@ inline std::string store_text(const std::string &path, std::size_t size)
     return text;
 }
 
-inline void store_decimal(const std::string &path, int value)
+// Bytes, and one for its end, of the longest text that is read whole.
+inline constexpr std::size_t LONGEST_TEXT = 1U << 20U;
+
+// The text at `path` however long it is; of one that is_cut only the start.
+inline std::string whole_text(const std::string &path)
 {
-    xml_set_str(path.c_str(), std::to_string(value).c_str());
+    std::string text;
+    std::size_t size = 4096;
+    do {
+        size *= 4;
+        text = store_text(path, size);
+    } while (text.size() == size - 1 && size < LONGEST_TEXT);
+    return text;
+}
+
+// Whether a text from whole_text may go on in the store.
+inline bool is_cut(const std::string &text)
+{
+    return text.size() >= LONGEST_TEXT - 1;
+}
+
+// Whether the store took the text.
+inline bool set_store_text(const std::string &path, const std::string &text)
+{
+    return xml_set_str(path.c_str(), text.c_str()) >= 0;
+}
+
+inline bool store_decimal(const std::string &path, int value)
+{
+    return set_store_text(path, std::to_string(value));
 }
 
 } // namespace bakjob

@@ -1,0 +1,32 @@
+#pragma once
+
+// A state of a job that the configuration did not take, for example on a full disk: kept in a file of its
+// own, so that nobody takes the state before it for the present one. Backups and restores have a state each.
+// Use under the configuration lock.
+
+#include "common/job_name.h"
+
+#include <cstdint>
+#include <optional>
+#include <string>
+
+namespace bakjob
+{
+
+enum class StateKind { BACKUP, RESTORE };
+
+struct UnrecordedState {
+    std::int32_t state;
+    std::string time; // as rsync_job_time writes it
+};
+
+// Keeps it in place of an earlier one of its kind. False (errno) when that cannot be written either.
+bool rsync_keep_unrecorded(const JobName &job, StateKind kind, const UnrecordedState &state);
+
+// Nothing when the configuration has the job's state of that kind.
+std::optional<UnrecordedState> rsync_unrecorded_state(const JobName &job, StateKind kind);
+
+// To be called when the configuration has taken a state of that kind.
+void rsync_forget_unrecorded(const JobName &job, StateKind kind);
+
+} // namespace bakjob

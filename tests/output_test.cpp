@@ -1,0 +1,55 @@
+// What reaches people's terminals.
+
+#include "output.h"
+
+#include <gtest/gtest.h>
+#include <map>
+
+using namespace bakjob::ctl;
+
+TEST(Output, NothingThatATerminalActsOnIsPrinted)
+{
+    const std::map<std::string, std::string> cases = {
+        {"plain text", "plain text"},
+        {"a\033[2Jb", "a?[2Jb"},
+        {"a\tb\nc\rd\177", "a?b?c?d?"},
+        {"a\xC2\x9B 2J", "a? 2J"}, // C1 in UTF-8
+        {"gr\xC3\xBC\xC3\x9F", "gr\xC3\xBC\xC3\x9F"},
+        {"\xC2\xA0", "\xC2\xA0"},
+        {"\xE2\x82\xAC \xF0\x9F\x98\x80", "\xE2\x82\xAC \xF0\x9F\x98\x80"},
+        {"\x9B"
+         "2J",
+         "?2J"}, // C1 by itself, for terminals that take bytes
+        {"\xC3\xBC\x9B"
+         "2J",
+         "\xC3\xBC?2J"},
+        {"\xE2\x9B"
+         "2J",
+         "??2J"},                            // cut
+        {"\xC0\xAF \xED\xA0\x80", "?? ???"}, // too long a form, half of a pair
+        {"a\xE2\x80\xAE!", "a?!"},           // turns the direction of writing
+    };
+    for (const auto &[text, shown] : cases)
+        EXPECT_EQ(bakjob::printable(text), shown);
+}
+
+TEST(Output, TextsFitByCharactersNotBytes)
+{
+    const std::string text = "a\xC3\xBC\xE2\x82\xAC"
+                             "b";
+    const std::vector<std::string> starts = {"", "a", "a\xC3\xBC", "a\xC3\xBC\xE2\x82\xAC", text, text};
+    for (std::size_t columns = 0; columns < starts.size(); ++columns)
+        EXPECT_EQ(fitting(text, columns), starts[columns]) << columns;
+
+    testing::internal::CaptureStdout();
+    print_table({"NAME", "X"}, {{"gr\xC3\xBC\xC3\x9F"
+                                 "e",
+                                 "1"},
+                                {"a", ""},
+                                {"b\033", "2"}});
+    EXPECT_EQ(testing::internal::GetCapturedStdout(), "NAME   X\ngr\xC3\xBC\xC3\x9F"
+                                                      "e  1\na\nb?     2\n");
+    testing::internal::CaptureStdout();
+    print_table({}, {{""}, {"", "x"}});
+    EXPECT_EQ(testing::internal::GetCapturedStdout(), "\n  x\n");
+}

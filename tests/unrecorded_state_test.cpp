@@ -1,0 +1,123 @@
+// A configuration that cannot be written, and a run that must say so elsewhere.
+
+#include "cli/job_state.h"
+#include "cli/unrecorded_state.h"
+#include "common/run_options.h"
+#include "ctl_support.h"
+
+#include <filesystem>
+#include <optional>
+#include <sys/mount.h>
+
+using namespace bakjob;
+namespace fs = std::filesystem;
+
+namespace
+{
+
+constexpr const char *KEPT = "/var/run/bakjob_daily.unrecorded";
+
+class UnrecordedState : public Ctl
+{
+protected:
+    void SetUp() override
+    {
+        Ctl::SetUp();
+        ASSERT_TRUE(says(add("daily"), 0, ""));
+        ASSERT_EQ(bakjob_program("-r daily").status, 0);
+        ASSERT_TRUE(says(ctl("status"), 0, "done"));
+    }
+
+    void TearDown() override
+    {
+        read_only_.reset();
+        Ctl::TearDown();
+    }
+
+    void lock_configuration() { read_only_.emplace("/etc/NAS_CFG"); }
+    void unlock_configuration() { read_only_.reset(); }
+
+private:
+    std::optional<ReadOnly> read_only_;
+};
+
+TEST_F(UnrecordedState, AFailedRunNeverReadsAsDone)
+{
+    EXPECT_TRUE(says(ctl("check daily"), 0, "0 problems"));
+    EXPECT_FALSE(exists(KEPT));
+    fs::remove_all("/mnt/HD/HD_a2/Public");
+    lock_configuration();
+    EXPECT_TRUE(says(ctl("check daily"), 1, "configuration: it cannot be written, so no run can record"));
+    EXPECT_TRUE(says(bakjob_program("-d -r daily"), 0, "state 4 of [daily] is not recorded"));
+    EXPECT_EQ(octal_mode(KEPT), "600");
+    const std::string words = "failed, not recorded: the configuration could not be written";
+    EXPECT_TRUE(says(ctl("status"), 1, words));
+    EXPECT_TRUE(says(ctl("list"), 0, words));
+    EXPECT_TRUE(says(ctl("show daily"), 0, words));
+    EXPECT_TRUE(says(ctl("show daily --json"), 0, "\"outcome\": \"failed\""));
+    EXPECT_TRUE(says(ctl("watch daily"), 1, words));
+    EXPECT_TRUE(
+        says(ctl("check daily"), 1, "could not be written at the end of a run, and does not say: failed"));
+
+    unlock_configuration();
+    EXPECT_TRUE(says(ctl("status"), 1, words)) << "until it is recorded";
+    fs::create_directories("/mnt/HD/HD_a2/Public");
+    ASSERT_EQ(bakjob_program("-r daily").status, 0);
+    EXPECT_FALSE(exists(KEPT));
+    EXPECT_TRUE(says(ctl("status"), 0, "done "));
+    EXPECT_TRUE(says(ctl("check daily"), 0, "0 problems"));
+}
+
+TEST_F(UnrecordedState, BackupAndRestoreAreKeptApart)
+{
+    lock_configuration();
+    ASSERT_EQ(bakjob_program("-k daily").status, 0);
+    rsync_keep_unrecorded(named("daily"), StateKind::RESTORE, {JOB_FAILED, "then"});
+    EXPECT_TRUE(says(ctl("status"), 1, "killed, not recorded"));
+    EXPECT_TRUE(says(ctl("status"), 1, "restore failed, not recorded"));
+    unlock_configuration();
+    run_options.restore_mode = 1;
+    rsync_set_job_state("daily", JOB_DONE);
+    EXPECT_TRUE(says(ctl("status"), 1, "killed, not recorded"));
+    EXPECT_TRUE(says(ctl("status"), 1, "restore done  "));
+    run_options.restore_mode = 0;
+    rsync_set_job_state("daily", JOB_DONE);
+    EXPECT_FALSE(exists(KEPT));
+}
+
+TEST_F(UnrecordedState, AClaimOfARunIsBelievedOnlyWhileThereIsOne)
+{
+    lock_configuration();
+    rsync_set_job_state("daily", JOB_STARTING);
+    EXPECT_TRUE(says(ctl("status"), 1, "interrupted, not recorded"));
+    unlock_configuration();
+    rsync_set_job_state("daily", JOB_RUNNING);
+    lock_configuration();
+    EXPECT_TRUE(says(bakjob_program("-d -a"), 0, "stale states are not reset"));
+    unlock_configuration();
+    EXPECT_EQ(bakjob_program("-a").status, 0);
+    EXPECT_EQ(job_key(1, "state"), "8");
+
+    write_file("/tmp/planted", "state 2 then\n");
+    fs::create_symlink("/tmp/planted", KEPT);
+    EXPECT_TRUE(says(ctl("status"), 1, "interrupted"));
+    rsync_keep_unrecorded(named("daily"), StateKind::BACKUP, {JOB_KILLED, "now"});
+    EXPECT_EQ(read_file("/tmp/planted"), "state 2 then\n");
+    for (const char *damaged : {"", "state", "state x then\n", "state 2x then\n", "rstate\nstate \n"}) {
+        write_file(KEPT, damaged);
+        EXPECT_TRUE(says(ctl("status"), 1, "interrupted")) << damaged;
+    }
+}
+
+TEST_F(UnrecordedState, ACheckFindsThatThereIsNoRoomForAnotherCopy)
+{
+    const std::string config = read_file(STORE);
+    ASSERT_EQ(mount("none", "/etc/NAS_CFG", "tmpfs", 0, "size=64k"), 0);
+    write_file(STORE, config);
+    EXPECT_TRUE(says(ctl("check daily"), 0, "0 problems"));
+    shell("head -c 1M /dev/zero >/etc/NAS_CFG/filler 2>/dev/null");
+    EXPECT_TRUE(says(ctl("check daily"), 1, "/etc/NAS_CFG: no room for another copy"));
+    umount2("/etc/NAS_CFG", MNT_DETACH);
+}
+
+} // namespace
