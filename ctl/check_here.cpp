@@ -177,7 +177,7 @@ void Check::configuration()
         const Standing standing = standing_of(job_, kind);
         if (standing.recorded) continue;
         problem("configuration",
-                std::string("it could not be written at the end of a ") +
+                std::string("it could not be written in a ") +
                     (kind == StateKind::BACKUP ? "run" : "restore") +
                     ", and does not say: " + words_of_state(standing.state).words + ", " + standing.time,
                 "The next run that can be recorded clears this.");

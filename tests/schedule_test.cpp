@@ -129,7 +129,12 @@ TEST_F(Schedule, AnEntryIsCreatedForTheSchedulerAndTheGroupDeleted)
     EXPECT_EQ(LIB_do_ctc(), 0) << "ends with the entries that are there, whatever the count says";
     EXPECT_EQ(lines_of(read_file("/etc/cron.d/device_scheduler")).size(), 2U);
     EXPECT_LT(LIB_create_xml("7", "2", "*", "*", "1", "root", "x", "rsync"), 0);
-    store_set("/system_mgr/crond/list/count", "1");
+    for (const char *list : {"/system_mgr/crond/rsync/count", "/system_mgr/crond/list/count"}) {
+        store_set(list, "0");
+        EXPECT_LT(LIB_create_xml("7", "2", "*", "*", "1", "root", "x", "rsync"), 0) << "in an entry's place";
+        store_set(list, list == std::string("/system_mgr/crond/list/count") ? "1" : "2");
+    }
+    EXPECT_EQ(entries(), "/usr/sbin/bakjob -r '100%'|/usr/sbin/bakjob -r 'b'|");
     rsync_delete_schedule();
     EXPECT_EQ(entries(), "");
     EXPECT_EQ(read_file("/etc/cron.d/device_scheduler").find("bakjob -r"), std::string::npos);

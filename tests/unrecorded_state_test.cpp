@@ -56,8 +56,7 @@ TEST_F(UnrecordedState, AFailedRunNeverReadsAsDone)
     EXPECT_TRUE(says(ctl("show daily"), 0, words));
     EXPECT_TRUE(says(ctl("show daily --json"), 0, "\"outcome\": \"failed\""));
     EXPECT_TRUE(says(ctl("watch daily"), 1, words));
-    EXPECT_TRUE(
-        says(ctl("check daily"), 1, "could not be written at the end of a run, and does not say: failed"));
+    EXPECT_TRUE(says(ctl("check daily"), 1, "could not be written in a run, and does not say: failed"));
 
     unlock_configuration();
     EXPECT_TRUE(says(ctl("status"), 1, words)) << "until it is recorded";

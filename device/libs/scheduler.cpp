@@ -150,6 +150,9 @@ int LIB_create_xml(const char *minute, const char *hour, const char *day, const 
     if (std::count(values.begin(), values.end(), nullptr) > 0 || !group || !is_group_name(group)) return -1;
     const std::string path = group_path(group);
     const int number = count_of(path) + 1;
+    // Behind a count that is too low stands something that the new one would replace.
+    if (store_text(item_path(path, number))) return -1;
+    if (place_of(group) == 0 && store_text(listed_name(count_of(GROUP_LIST) + 1))) return -1;
     for (std::size_t i = 0; i < KEYS.size(); ++i) {
         if (!set(item_path(path, number) + "/" + KEYS[i], values[i])) return -1;
     }
