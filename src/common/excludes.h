@@ -7,8 +7,8 @@
 namespace bakjob
 {
 
-// The options that leave those names out, one for each, with a blank in front and behind. The number of blanks
-// between them is part of each form.
+// The options that leave those names out, one for each, with a blank in front and behind. The number of
+// blanks between them is part of each form.
 enum class ExcludeForm {
     TRANSFER,  // rsync
     DU_HERE,   // du
