@@ -10,10 +10,9 @@
 #include "config/job_store.h"
 #include "platform/config_store.h"
 #include "remote/discovery.h"
-#include "support.h"
+#include "soak_support.h"
 
 #include <algorithm>
-#include <arpa/inet.h>
 #include <chrono>
 #include <csignal>
 #include <cstring>
@@ -22,7 +21,6 @@
 #include <fstream>
 #include <random>
 #include <sys/resource.h>
-#include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -33,77 +31,7 @@ namespace fs = std::filesystem;
 namespace
 {
 
-constexpr const char *SHARE = "/mnt/HD/HD_a2/Public";
 constexpr const char *CONFIG = "/etc/NAS_CFG/config.xml";
-
-const char *soak_table()
-{
-    return std::getenv("BAKJOB_SOAK");
-}
-
-int rounds(int here, int soaking)
-{
-    return soak_table() == nullptr ? here : soaking;
-}
-
-// Starts the program; its output goes to a file.
-pid_t start(const std::vector<std::string> &arguments)
-{
-    const pid_t child = fork();
-    if (child != 0) return child;
-    const int output = open("/tmp/output", O_WRONLY | O_CREAT | O_TRUNC, 0600);
-    dup2(output, STDOUT_FILENO);
-    dup2(output, STDERR_FILENO);
-    std::vector<char *> argv{const_cast<char *>("bakjob")};
-    for (const std::string &argument : arguments)
-        argv.push_back(const_cast<char *>(argument.c_str()));
-    argv.push_back(nullptr);
-    execv("/usr/sbin/bakjob", argv.data());
-    _exit(127);
-}
-
-int wait_for(pid_t child)
-{
-    int status = 0;
-    waitpid(child, &status, 0);
-    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
-}
-
-// Runs the program with arguments that no shell sees. Its trace.
-std::string traced(std::vector<std::string> arguments)
-{
-    arguments.insert(arguments.begin(), "-d");
-    wait_for(start(arguments));
-    return read_file("/tmp/output");
-}
-
-} // namespace
-
-class Holds : public Appliance
-{
-protected:
-    void SetUp() override
-    {
-        Appliance::SetUp();
-        add_share("Public", SHARE);
-        write_file(std::string(SHARE) + "/file", "x");
-        write_file("/tmp/kv_serial.txt", "S1");
-        shell("mkdir -p ~root/.ssh"); // as a first ssh login would
-        fs::create_directories("/remote/backup/S1_remote_backup/daily");
-        fs::create_directories("/remote/data/S1_remote_backup/daily");
-    }
-
-    // A row of the soak's table, and the verdict.
-    static void expect_none_of(int tries, int failures, const std::string &what)
-    {
-        EXPECT_EQ(failures, 0) << what;
-        if (soak_table() != nullptr)
-            std::ofstream(soak_table(), std::ios::app) << what << '\t' << tries << '\t' << failures << '\n';
-    }
-};
-
-namespace
-{
 
 // Names and contents of everything outside of a job's own places.
 std::string elsewhere()
@@ -494,56 +422,6 @@ TEST_F(Holds, NobodyElseCanEverReadThePassword)
     expect_none_of(tries, wait_for(thief) == 128 + SIGKILL ? 0 : 1,
                    "runs beside a reader of passwords: nothing read");
 }
-
-namespace
-{
-
-// A server on 127.0.0.9:873 that does to each connection as told.
-class BadServer
-{
-public:
-    explicit BadServer(const std::function<void(int)> &behave)
-    {
-        const int listening = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
-        const int on = 1;
-        setsockopt(listening, SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
-        sockaddr_in address{};
-        address.sin_family = AF_INET;
-        address.sin_port = htons(873);
-        inet_pton(AF_INET, "127.0.0.9", &address.sin_addr);
-        bound_ = bind(listening, reinterpret_cast<sockaddr *>(&address), sizeof address) == 0 &&
-                 listen(listening, 8) == 0;
-        server_ = fork();
-        if (server_ == 0) {
-            std::signal(SIGPIPE, SIG_IGN);
-            std::signal(SIGCHLD, SIG_IGN);
-            for (;;) {
-                const int connection = accept(listening, nullptr, nullptr);
-                if (fork() == 0) {
-                    close(listening);
-                    behave(connection);
-                    _exit(0);
-                }
-                close(connection);
-            }
-        }
-        close(listening);
-    }
-    BadServer(const BadServer &) = delete;
-    BadServer &operator=(const BadServer &) = delete;
-    ~BadServer()
-    {
-        kill(server_, SIGKILL);
-        waitpid(server_, nullptr, 0);
-    }
-    [[nodiscard]] bool bound() const { return bound_; }
-
-private:
-    pid_t server_ = -1;
-    bool bound_ = false;
-};
-
-} // namespace
 
 TEST_F(Holds, AMisbehavingRemoteSideIsAFailedFolder)
 {
