@@ -5,6 +5,7 @@
 
 #include <CLI/CLI.hpp>
 #include <array>
+#include <csignal>
 #include <cstdio>
 #include <exception>
 #include <string_view>
@@ -101,6 +102,7 @@ int run(int argc, char **argv)
 
 int main(int argc, char **argv)
 {
+    std::signal(SIGXFSZ, SIG_IGN); // a file that may not grow is a failed write
     try {
         const int status = run(argc, argv);
         if (std::fflush(stdout) == 0 && std::ferror(stdout) == 0) return status;

@@ -3,9 +3,10 @@
 //   --job-name=NAME   the job that a transfer belongs to; it stays visible in the process list
 //   --dump-size       publish how far the job's transfer is (transfer_figures.h)
 //
-// It never asks a question, and gives up on a far end that stays silent.
+// It never asks a question, and gives up on a far end that stays silent. A probe may not take long in all,
+// even if the far end keeps talking (stock_program.h).
 
-#include "stock_rsync.h"
+#include "stock_program.h"
 #include "transfer_figures.h"
 
 #include <algorithm>
@@ -23,7 +24,7 @@ namespace
 
 using Arguments = std::vector<std::string>;
 
-constexpr const char *STOCK_RSYNC = "/usr/bin/rsync";
+constexpr StockProgram STOCK_RSYNC = {"rsync", "/usr/bin/rsync", EXIT_FAILURE, 30};
 constexpr const char *OWN_NAME = "/usr/sbin/rsync";
 constexpr const char *REMOTE_SHELL = "/usr/sbin/ssh";
 constexpr std::string_view JOB_NAME = "--job-name=";
@@ -93,24 +94,12 @@ bool has_figures(const std::string &job_name)
 
 } // namespace
 
-int exec_stock_rsync(const Arguments &arguments)
-{
-    std::vector<char *> pointers;
-    for (const std::string &argument : arguments) {
-        pointers.push_back(const_cast<char *>(argument.c_str()));
-    }
-    pointers.push_back(nullptr);
-    execv(STOCK_RSYNC, pointers.data());
-    std::fprintf(stderr, "rsync: cannot run %s: %s\n", STOCK_RSYNC, std::strerror(errno));
-    return EXIT_FAILURE;
-}
-
 int main(int argc, char **argv)
 {
     Arguments arguments(argv + 1, argv + argc);
     if (!arguments.empty() && arguments.front() == "--server") {
         arguments.insert(arguments.begin(), OWN_NAME);
-        return exec_stock_rsync(arguments);
+        return become_stock(STOCK_RSYNC, arguments);
     }
     const std::string job = take_option(arguments, JOB_NAME);
     const bool dump_size = !take_option(arguments, "--dump-size").empty();
@@ -119,6 +108,7 @@ int main(int argc, char **argv)
     setenv("RSYNC_PASSWORD", "", 0);
     arguments.insert(arguments.begin(), job.empty() ? OWN_NAME : OWN_NAME + (' ' + job));
     const std::string job_name = job.substr(std::min(JOB_NAME.size(), job.size()));
-    if (dump_size && has_figures(job_name)) return run_with_figures(job_name, arguments);
-    return exec_stock_rsync(arguments);
+    if (!job.empty() || has_option(arguments, "--daemon")) mark_transfer();
+    if (dump_size && has_figures(job_name)) return run_with_figures(STOCK_RSYNC, job_name, arguments);
+    return run_stock(STOCK_RSYNC, arguments);
 }

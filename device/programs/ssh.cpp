@@ -1,8 +1,11 @@
 // ssh: the stock client, with the login password as an option, "-d BASE64". It never asks a question: a new
-// host's key is taken and kept, a changed one refused, and without -d there is no password.
+// host's key is taken and kept, a changed one refused, and without -d there is no password. A probe may not
+// take long in all (stock_program.h).
 //
 // The stock client gets the password from a helper that it starts, which is this program again. It is told
 // so, and given the base64 text, by an environment variable.
+
+#include "stock_program.h"
 
 #include <algorithm>
 #include <array>
@@ -24,11 +27,11 @@
 namespace
 {
 
-constexpr const char *STOCK_SSH = "/usr/bin/ssh";
+constexpr int FAILED = 255; // as the stock client ends
+constexpr StockProgram STOCK_SSH = {"ssh", "/usr/bin/ssh", FAILED, FAILED};
 constexpr const char *PASSWORD_VARIABLE = "DEVICE_SSH_PASSWORD";
 constexpr const char *STOCK_OPTIONS =
     "+1246ab:c:e:fgi:kl:m:no:p:qstvxAB:CD:E:F:GI:J:KL:MNO:PQ:R:S:TVw:W:XYyd:";
-constexpr int FAILED = 255; // as the stock client ends
 
 // They come behind the caller's own: the stock client takes the first value that it is given. Nothing below
 // an error is printed, or the news of a learnt host key would hide the reply.
@@ -67,10 +70,11 @@ std::string known_ciphers()
     posix_spawn_file_actions_init(&actions);
     posix_spawn_file_actions_adddup2(&actions, ends[1], STDOUT_FILENO);
     posix_spawn_file_actions_addclose(&actions, ends[0]);
-    std::array<std::string, 3> words = {STOCK_SSH, "-Q", "cipher"};
+    std::array<std::string, 3> words = {STOCK_SSH.path, "-Q", "cipher"};
     std::array<char *, 4> arguments = {words[0].data(), words[1].data(), words[2].data(), nullptr};
     pid_t child = 0;
-    const bool started = posix_spawn(&child, STOCK_SSH, &actions, nullptr, arguments.data(), environ) == 0;
+    const bool started =
+        posix_spawn(&child, STOCK_SSH.path, &actions, nullptr, arguments.data(), environ) == 0;
     posix_spawn_file_actions_destroy(&actions);
     close(ends[1]);
     std::string output;
@@ -100,17 +104,18 @@ std::string usable_ciphers(std::string_view list)
 }
 
 struct Call {
-    std::vector<std::string> arguments = {STOCK_SSH};
+    std::vector<std::string> arguments = {STOCK_SSH.path};
     std::optional<std::string> password; // in base64
     bool valid = true;
 };
 
-void take_option(Call &call, int letter, const char *value)
+void take_option(Call &call, int letter, char *value)
 {
     if (letter == 'd') {
         call.valid = call.valid && decode(value);
         if (!call.valid) std::fputs("ssh: the password after -d is not base64 text\n", stderr);
         call.password = value;
+        std::fill_n(value, std::strlen(value), 'x'); // this process may stay in the process list
         return;
     }
     std::string text = value ? value : "";
@@ -161,12 +166,5 @@ int main(int argc, char **argv)
         std::fprintf(stderr, "ssh: cannot hand over the password: %s\n", std::strerror(errno));
         return FAILED;
     }
-    std::vector<char *> arguments;
-    for (std::string &argument : call.arguments) {
-        arguments.push_back(argument.data());
-    }
-    arguments.push_back(nullptr);
-    execv(STOCK_SSH, arguments.data());
-    std::fprintf(stderr, "ssh: cannot run %s: %s\n", STOCK_SSH, std::strerror(errno));
-    return FAILED;
+    return run_stock(STOCK_SSH, call.arguments);
 }

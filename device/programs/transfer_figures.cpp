@@ -1,7 +1,6 @@
 #include "transfer_figures.h"
 
 #include "common/handles.h"
-#include "stock_rsync.h"
 
 #include <algorithm>
 #include <array>
@@ -108,24 +107,26 @@ void read_lines(int fd, const Take &take, const Pause &pause)
     }
 }
 
-[[noreturn]] void become_stock(const std::vector<std::string> &arguments, int output)
+[[noreturn]] void become_child(const StockProgram &rsync, const std::vector<std::string> &arguments,
+                               int output)
 {
     prctl(PR_SET_PDEATHSIG, SIGTERM);
     dup2(output, STDOUT_FILENO);
-    std::exit(exec_stock_rsync(arguments));
+    std::exit(become_stock(rsync, arguments));
 }
 
 } // namespace
 
-int run_with_figures(const std::string &job_name, std::vector<std::string> arguments)
+int run_with_figures(const StockProgram &rsync, const std::string &job_name,
+                     std::vector<std::string> arguments)
 {
     const bool dry_run = std::count(arguments.begin(), arguments.end(), "--dry-run") > 0;
     make_talk(arguments, dry_run);
     std::array<int, 2> ends{};
-    if (pipe2(ends.data(), O_CLOEXEC) < 0) return exec_stock_rsync(arguments);
+    if (pipe2(ends.data(), O_CLOEXEC) < 0) return become_stock(rsync, arguments);
     const pid_t child = fork();
-    if (child < 0) return exec_stock_rsync(arguments);
-    if (child == 0) become_stock(arguments, ends[1]);
+    if (child < 0) return become_stock(rsync, arguments);
+    if (child == 0) become_child(rsync, arguments, ends[1]);
     close(ends[1]);
 
     const std::string path = "/tmp/r_" + job_name;

@@ -3,6 +3,7 @@
 #include "cli/process_guard.h"
 #include "cli/unrecorded_state.h"
 #include "common/debug_log.h"
+#include "common/interrupt.h"
 #include "common/job_files.h"
 #include "common/run_options.h"
 #include "common/text.h"
@@ -14,6 +15,7 @@
 #include <cerrno>
 #include <cstring>
 #include <ctime>
+#include <exception>
 #include <utility>
 #include <vector>
 
@@ -23,11 +25,15 @@ namespace bakjob
 namespace
 {
 
+bool saving = false; // and still true behind a save that threw
+
 // Whether the configuration has taken the states.
 bool save_and_commit()
 {
+    saving = true;
     const bool saved = rsync_save_jobs();
     LIB_CP_Config_To_MTD(1);
+    saving = false;
     return saved;
 }
 
@@ -44,6 +50,11 @@ void keep_unrecorded(const std::string &job_name, StateKind kind, const Unrecord
 void forget_unrecorded(const std::string &job_name, StateKind kind)
 {
     if (const auto name = JobName::checked(job_name)) rsync_forget_unrecorded(*name, kind);
+}
+
+StateKind kind_of_run()
+{
+    return run_options.restore_mode != 0 ? StateKind::RESTORE : StateKind::BACKUP;
 }
 
 bool reset_if_stale(std::int32_t &state, char (&time)[JOB_TIME_SIZE], const char *now)
@@ -83,12 +94,28 @@ void rsync_set_job_state(const std::string &job_name, JobState state)
     auto &time = restore ? job->rlast_do_job_time : job->last_do_job_time;
     rsync_job_time(time);
     const UnrecordedState as_set{state, time}; // the save frees the job
-    const StateKind kind = restore ? StateKind::RESTORE : StateKind::BACKUP;
+    const StateKind kind = kind_of_run();
     if (save_and_commit()) {
         forget_unrecorded(job_name, kind);
     } else {
         keep_unrecorded(job_name, kind, as_set);
     }
+}
+
+void rsync_record_interruption(const std::string &job_name)
+{
+    if (!saving) {
+        try {
+            rsync_free_jobs();
+            rsync_set_job_state(job_name, JOB_INTERRUPTED);
+            return;
+        } catch (const std::exception &why) {
+            DebugLog("ERROR: state %d of [%s]: %s\n", JOB_INTERRUPTED, job_name.c_str(), why.what());
+        }
+    }
+    char now[JOB_TIME_SIZE] = "";
+    rsync_job_time(now);
+    keep_unrecorded(job_name, kind_of_run(), {JOB_INTERRUPTED, now});
 }
 
 void rsync_reset_stale_states()

@@ -12,6 +12,7 @@
 #include <charconv>
 #include <fcntl.h>
 #include <fstream>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -21,18 +22,47 @@ namespace bakjob
 namespace
 {
 
+constexpr const char *PID_FOLDER = "/var/run"; // of pid_file
+constexpr mode_t PID_FILE_MODE = 0644;
+
 // The file's text becomes the argument of a kill as root: it has to be one process id and nothing else. 0
 // when it is not.
-pid_t process_id_in(const std::string &path)
+pid_t process_id_in(int file)
 {
-    const UniqueFd file = open_own_file(path, O_RDONLY);
     char text[32] = "";
-    if (!file || read(file.get(), text, sizeof text - 1) <= 0) return 0;
+    if (pread(file, text, sizeof text - 1, 0) <= 0) return 0;
     const std::string_view content(text);
     pid_t pid = 0;
     const auto [end, error] = std::from_chars(content.data(), content.data() + content.size(), pid);
     const bool whole = error == std::errc() && (*end == '\0' || std::string_view(end) == "\n");
     return whole && pid > 0 ? pid : 0;
+}
+
+bool is_at(const std::string &path, int file)
+{
+    struct stat there = {};
+    struct stat here = {};
+    return lstat(path.c_str(), &there) == 0 && fstat(file, &here) == 0 && there.st_ino == here.st_ino &&
+           there.st_dev == here.st_dev;
+}
+
+// Whoever removes a pid file locks it first, so that it does not become another one between the look and the
+// removal. Everybody can read the file, so that everybody can lock it, too: nobody is waited for long.
+void lock_briefly(int file)
+{
+    for (int i = 0; i < 100 && flock(file, LOCK_EX | LOCK_NB) != 0 && errno == EWOULDBLOCK; ++i) {
+        usleep(10'000);
+    }
+}
+
+// The whole file at once; no handle (errno) where the file system cannot do that.
+UniqueFd link_pid_file(const std::string &path, std::string_view text)
+{
+    UniqueFd file(open(PID_FOLDER, O_TMPFILE | O_WRONLY | O_CLOEXEC, PID_FILE_MODE));
+    if (!file || fchmod(file.get(), PID_FILE_MODE) != 0 || !write_all(file.get(), text)) return UniqueFd();
+    const std::string handle = format_text("/proc/self/fd/%d", file.get());
+    if (linkat(AT_FDCWD, handle.c_str(), AT_FDCWD, path.c_str(), AT_SYMLINK_FOLLOW) == 0) return file;
+    return UniqueFd();
 }
 
 // By its command line: "bakjob", perhaps with a path or behind an emulator, and the name, perhaps joined to
@@ -57,27 +87,45 @@ bool rsync_pid_file_absent(const JobName &job)
     return lstat(pid_file(job).c_str(), &status) != 0;
 }
 
-bool rsync_write_pid_file(const JobName &job)
+UniqueFd rsync_write_pid_file(const JobName &job)
 {
     const std::string path = pid_file(job);
-    const UniqueFd file = create_file(path, 0644);
-    if (!file) return false;
-    if (write_all(file.get(), format_text("%d\n", getpid()))) return true;
+    const std::string text = format_text("%d\n", getpid());
+    UniqueFd file = link_pid_file(path, text);
+    if (file || errno == EEXIST) return file;
+    file = create_file(path, PID_FILE_MODE);
+    if (!file || write_all(file.get(), text)) return file;
     const int why = errno;
     unlink(path.c_str());
     errno = why;
-    return false;
+    return UniqueFd();
+}
+
+PidFile rsync_read_pid_file(const JobName &job)
+{
+    const std::string path = pid_file(job);
+    PidFile read{open_own_file(path, O_RDONLY), 0, false};
+    if (read.handle) {
+        read.process = process_id_in(read.handle.get());
+        read.is_run = read.process > 0 && runs_job(read.process, job.text());
+    } else {
+        read.handle = UniqueFd(open(path.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC)); // whatever it is
+    }
+    return read;
 }
 
 pid_t rsync_running_process(const JobName &job)
 {
-    const pid_t pid = process_id_in(pid_file(job));
-    return pid > 0 && runs_job(pid, job.text()) ? pid : 0;
+    const PidFile file = rsync_read_pid_file(job);
+    return file.is_run ? file.process : 0;
 }
 
-int rsync_remove_pid_file(const JobName &job)
+int rsync_remove_pid_file(const JobName &job, const UniqueFd &handle)
 {
-    return unlink(pid_file(job).c_str());
+    if (!handle) return -1;
+    const std::string path = pid_file(job);
+    lock_briefly(handle.get());
+    return is_at(path, handle.get()) ? unlink(path.c_str()) : -1;
 }
 
 std::string rsync_ps_command()
@@ -89,7 +137,7 @@ int rsync_kill_job_process(const JobName &job)
 {
     if (rsync_pid_file_absent(job)) return -1;
     const std::string path = pid_file(job);
-    if (process_id_in(path) == 0) {
+    if (rsync_read_pid_file(job).process == 0) {
         DebugLog("ERROR: no process id in [%s]\n", path.c_str());
         return -1;
     }

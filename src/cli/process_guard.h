@@ -3,6 +3,7 @@
 // Keeps a job from running twice, and stops it: a pid file per job, and the job's name on the command line of
 // each of its rsync processes.
 
+#include "common/handles.h"
 #include "common/job_name.h"
 
 #include <string>
@@ -15,16 +16,24 @@ namespace bakjob
 // running job until rsync_kill_job removes it.
 bool rsync_pid_file_absent(const JobName &job);
 
-// Makes the pid file, with this process's id. False (errno) when it cannot be made; EEXIST: another run was
-// quicker.
-bool rsync_write_pid_file(const JobName &job);
+// Makes the pid file, with this process's id; nobody ever sees it without. The handle tells it from a later
+// one. No handle (errno) when it cannot be made; EEXIST: another run was quicker.
+UniqueFd rsync_write_pid_file(const JobName &job);
+
+// What a pid file says, and which file it was.
+struct PidFile {
+    UniqueFd handle; // none: there was no file
+    pid_t process;   // 0: the file holds no process id
+    bool is_run;     // the process is one that runs the job, by its command line
+};
+PidFile rsync_read_pid_file(const JobName &job);
 
 // The process that the job's pid file names, if it is one that runs the job; else 0, also for another process
 // that has got its number.
 pid_t rsync_running_process(const JobName &job);
 
-// 0 when the file was there and is gone, else -1.
-int rsync_remove_pid_file(const JobName &job);
+// Removes the pid file if it still is the one that the handle is of. 0 when it is gone by that, else -1.
+int rsync_remove_pid_file(const JobName &job, const UniqueFd &handle);
 
 // The listing of processes that works here: "ps -ww" or "ps".
 std::string rsync_ps_command();

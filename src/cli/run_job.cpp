@@ -1,10 +1,13 @@
 #include "cli/run_job.h"
 
+#include "cli/broken_run.h"
 #include "cli/job_state.h"
 #include "cli/process_guard.h"
 #include "cli/recover_list.h"
+#include "cli/run_processes.h"
 #include "cli/source_folders.h"
 #include "common/debug_log.h"
+#include "common/interrupt.h"
 #include "common/job_files.h"
 #include "common/run_options.h"
 #include "config/job_list.h"
@@ -51,15 +54,16 @@ bool is_due(const RsyncJob &job, bool force)
     return job.inc_enable == 1 && rsync_list_snapshots(job.job_name) != 0;
 }
 
-bool take_pid_file(const JobName &name)
+UniqueFd take_pid_file(const JobName &name)
 {
-    if (rsync_write_pid_file(name)) return true;
+    UniqueFd file = rsync_write_pid_file(name);
+    if (file) return file;
     if (errno == EEXIST) {
         DebugLog("ERROR: rsync backup is running!\n");
     } else {
         DebugLog("ERROR: pid file [%s]: %s\n", pid_file(name).c_str(), std::strerror(errno));
     }
-    return false;
+    return file;
 }
 
 void raise_alert(const RsyncJob &job, bool done)
@@ -113,6 +117,15 @@ JobState final_state(const RsyncJob &job, bool outcome)
     return run_options.recover_seq != 0 ? JOB_RECOVER_FAILED : JOB_FAILED;
 }
 
+// A run that began while its job was being killed may have been killed, too.
+void clear_dead_run(const JobName &name)
+{
+    const PidFile file = rsync_read_pid_file(name);
+    if (file.process == 0 || is_running(file.process)) return;
+    RunProcesses(file.process, false).end(0);
+    rsync_remove_pid_file(name, file.handle);
+}
+
 } // namespace
 
 void rsync_alert_text(const RsyncJob &job)
@@ -142,12 +155,22 @@ bool rsync_run_job(const std::string &job_name, bool force, bool &outcome)
     }
     if (!is_due(*job, force)) return false;
     if (is_restore_run()) job->backup_type = BACKUP_PULL;
-    if (!take_pid_file(*name)) return false;
 
-    rsync_set_job_state(job_name, JOB_STARTING);
-    if (!run_folders(*job, *name)) outcome = false;
-    rsync_set_job_state(job_name, final_state(*job, outcome));
-    rsync_remove_pid_file(*name);
+    const CatchInterrupts interrupts;
+    const UniqueFd pid_file = take_pid_file(*name);
+    if (!pid_file) return false;
+    try {
+        rsync_set_job_state(job_name, JOB_STARTING);
+        if (!run_folders(*job, *name)) outcome = false;
+        rsync_set_job_state(job_name, final_state(*job, outcome));
+    } catch (const Interrupted &) {
+        rsync_end_broken_run(*name, pid_file);
+        return false; // to whoever handles the signal; by default, nobody is left
+    } catch (...) {
+        rsync_end_broken_run(*name, pid_file);
+        throw;
+    }
+    rsync_remove_pid_file(*name, pid_file);
     return true;
 }
 
@@ -158,11 +181,16 @@ void rsync_kill_job(const std::string &job_name)
         DebugLog("ERROR: job name refused: [%s]\n", job_name.c_str());
         return;
     }
+    const PidFile file = rsync_read_pid_file(*name);
+    std::optional<RunProcesses> started;
+    if (file.process > 0) started.emplace(file.process, file.is_run);
     if (rsync_kill_job_process(*name) == 0) std::puts("kill rsync job success .....");
     rsync_kill_transfers(*name);
+    if (started) started->end(0);
     rsync_set_job_state(job_name, JOB_KILLED);
     rsync_remove_progress(*name);
-    rsync_remove_pid_file(*name);
+    rsync_remove_pid_file(*name, file.handle);
+    clear_dead_run(*name);
 }
 
 } // namespace bakjob

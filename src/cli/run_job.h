@@ -18,9 +18,11 @@ enum AlertCode : int {
 
 // Runs the job: blocks until its last folder. `force` runs a job again that runs only once; `outcome` is
 // cleared when a folder fails, and never set. False when the run was refused: then nothing was changed.
+// SIGHUP, SIGINT and SIGTERM, unless they are ignored, end the run in order (broken_run.h) and then act as
+// they would have without it; if that does not end the process, the result is false.
 bool rsync_run_job(const std::string &job_name, bool force, bool &outcome);
 
-// Kills the job's process and its transfers, and records that it was killed.
+// Kills the job's process, its transfers and all else that it has started, and records that it was killed.
 void rsync_kill_job(const std::string &job_name);
 
 // Builds `alert_text` for the job as it stands: name, name of the device, and the folder's place. A text that

@@ -1,5 +1,6 @@
 #include "common/shell.h"
 
+#include "common/interrupt.h"
 #include "common/text.h"
 
 #include <algorithm>
@@ -11,6 +12,7 @@
 #include <spawn.h>
 #include <sys/wait.h>
 #include <unistd.h>
+#include <utility>
 
 namespace bakjob
 {
@@ -20,20 +22,20 @@ namespace
 
 constexpr std::size_t REPLY_LENGTH = 1023;
 
-// While a command runs, an interrupt from the terminal is for the command alone.
-class IgnoreInterrupts
+// While a command runs, what the terminal sends is for the command alone; but an interrupt ends a run.
+class IgnoreTerminal
 {
 public:
-    IgnoreInterrupts()
+    IgnoreTerminal()
     {
         struct sigaction ignore = {};
         ignore.sa_handler = SIG_IGN;
-        sigaction(SIGINT, &ignore, &interrupt_);
+        sigaction(SIGINT, interrupts_are_caught() ? nullptr : &ignore, &interrupt_);
         sigaction(SIGQUIT, &ignore, &quit_);
     }
-    IgnoreInterrupts(const IgnoreInterrupts &) = delete;
-    IgnoreInterrupts &operator=(const IgnoreInterrupts &) = delete;
-    ~IgnoreInterrupts()
+    IgnoreTerminal(const IgnoreTerminal &) = delete;
+    IgnoreTerminal &operator=(const IgnoreTerminal &) = delete;
+    ~IgnoreTerminal()
     {
         sigaction(SIGINT, &interrupt_, nullptr);
         sigaction(SIGQUIT, &quit_, nullptr);
@@ -58,8 +60,9 @@ private:
 pid_t start_shell(const std::string &command, int output, sigset_t signals)
 {
     const char *const arguments[] = {"sh", "-f", "-c", command.c_str(), nullptr};
+    const std::string mark = run_mark(getpid());
     const char *const environment[] = {"PATH=/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin",
-                                       "LC_ALL=C", nullptr};
+                                       "LC_ALL=C", mark.c_str(), nullptr};
     posix_spawn_file_actions_t handles;
     posix_spawn_file_actions_init(&handles);
     const UniqueFd nothing(open("/dev/null", O_RDONLY | O_CLOEXEC));
@@ -70,6 +73,7 @@ pid_t start_shell(const std::string &command, int output, sigset_t signals)
     posix_spawnattr_init(&attributes);
     posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGDEF);
     sigaddset(&signals, SIGPIPE);
+    sigaddset(&signals, SIGXFSZ);
     posix_spawnattr_setsigdefault(&attributes, &signals);
 
     pid_t child = -1;
@@ -86,11 +90,18 @@ int wait_for(pid_t child)
     int status = 0;
     while (waitpid(child, &status, 0) < 0) {
         if (errno != EINTR) return -1;
+        throw_if_interrupted();
     }
+    throw_if_interrupted(); // what the command was ended by may have been meant for the run as well
     return status;
 }
 
 } // namespace
+
+std::string run_mark(pid_t run)
+{
+    return format_text("%s=%d", RUN_MARK, run);
+}
 
 int exit_code(int status)
 {
@@ -100,14 +111,16 @@ int exit_code(int status)
 
 int run_shell(const std::string &command)
 {
+    throw_if_interrupted();
     std::fflush(stdout);
-    const IgnoreInterrupts ignore;
+    const IgnoreTerminal ignore;
     const pid_t child = start_shell(command, -1, ignore.not_ignored_before());
     return child < 0 ? -1 : wait_for(child);
 }
 
 ShellReader::ShellReader(const std::string &command)
 {
+    throw_if_interrupted();
     std::fflush(stdout);
     int ends[2];
     if (pipe2(ends, O_CLOEXEC) != 0) return;
@@ -121,20 +134,22 @@ ShellReader::ShellReader(const std::string &command)
 
 ShellReader::~ShellReader()
 {
-    close();
+    // A command that was not waited for, in a run, is ended with the run.
+    if (child_ > 0 && !interrupts_are_caught()) close();
 }
 
 bool ShellReader::read_line(std::string &line)
 {
-    return output_ && bakjob::read_line(output_.get(), line);
+    const bool read = output_ && bakjob::read_line(output_.get(), line);
+    throw_if_interrupted(); // an end may be none
+    return read;
 }
 
 int ShellReader::close()
 {
     output_.reset();
-    const int status = child_ > 0 ? wait_for(child_) : -1;
-    child_ = -1;
-    return status;
+    const pid_t child = std::exchange(child_, -1);
+    return child > 0 ? wait_for(child) : -1;
 }
 
 std::optional<std::string> first_line(const std::string &command)

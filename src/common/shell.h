@@ -1,8 +1,11 @@
 #pragma once
 
 // The one module that runs commands: through the system shell, one at a time, waited for. Commands see a
-// fixed environment (the standard folders for programs, messages in English), nothing on their standard
-// input, and no file-name patterns: an IPv6 host in brackets is not one.
+// fixed environment (the standard folders for programs, messages in English, the mark of this process),
+// nothing on their standard input, and no file-name patterns: an IPv6 host in brackets is not one.
+//
+// During a run (interrupt.h) a signal that ends it ends the waits, too: these functions throw Interrupted,
+// and the command is left to whoever ends the run.
 
 #include "common/handles.h"
 
@@ -15,6 +18,10 @@ namespace bakjob
 {
 
 inline constexpr std::size_t COMMAND_SIZE = 2048; // bytes of a command, terminator included
+
+// In the environment of every command, with the id of this process: what a run has started is known by it.
+inline constexpr const char *RUN_MARK = "BAKJOB_RUN";
+std::string run_mark(pid_t run); // the whole entry
 
 // Whether a composed command fits its buffer. One that does not is refused, never cut.
 inline bool fits_command(const std::string &command)

@@ -1,5 +1,6 @@
 #include "config/config_lock.h"
 
+#include "common/interrupt.h"
 #include "common/private_file.h"
 
 #include <cerrno>
@@ -50,6 +51,7 @@ UniqueFd rsync_lock_config(const char *path)
         if (!file) return file;
         while (flock(file.get(), LOCK_EX) != 0) {
             if (errno != EINTR) return UniqueFd();
+            throw_if_interrupted();
         }
         // Somebody may have replaced the file while we waited: then the lock is on the new one.
         if (is_still_at(path, file.get())) return file;

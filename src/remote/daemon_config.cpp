@@ -1,6 +1,7 @@
 #include "remote/daemon_config.h"
 
 #include "common/debug_log.h"
+#include "common/interrupt.h"
 #include "common/private_file.h"
 #include "common/shell.h"
 #include "common/shell_text.h"
@@ -23,12 +24,18 @@ namespace
 constexpr std::string_view PATH_KEY = "path = ";
 constexpr int MOST_TESTS = 10;
 
-bool wait_for_file(const std::string &path)
+void wait_a_second()
 {
     sleep(1);
+    throw_if_interrupted();
+}
+
+bool wait_for_file(const std::string &path)
+{
+    wait_a_second();
     for (int test = 0; test < MOST_TESTS; ++test) {
         if (access(path.c_str(), F_OK) == 0) return true;
-        sleep(1);
+        wait_a_second();
     }
     return false;
 }

@@ -3,6 +3,7 @@
 #include "cli/job_state.h"
 #include "cli/source_folders.h"
 #include "common/debug_log.h"
+#include "common/interrupt.h"
 #include "common/job_files.h"
 #include "common/private_file.h"
 #include "common/run_options.h"
@@ -135,7 +136,9 @@ bool rsync_write_password_file()
 int select_sleep(int seconds, int milliseconds)
 {
     timeval time{.tv_sec = seconds, .tv_usec = suseconds_t{1000} * milliseconds};
-    return select(0, nullptr, nullptr, nullptr, &time);
+    const int result = select(0, nullptr, nullptr, nullptr, &time);
+    throw_if_interrupted();
+    return result;
 }
 
 BackupResult rsync_run_backup(const JobName &job_name, RsyncJob &job)

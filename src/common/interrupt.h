@@ -1,0 +1,43 @@
+#pragma once
+
+// How a signal ends a run in order: while one goes on, SIGHUP, SIGINT and SIGTERM are only noted, and
+// whatever waits then throws. Signals that were ignored at the start stay ignored.
+//
+// No wait misses a signal: from the first one on, an alarm goes off every second, which ends each wait that
+// began between the look at the note and the wait itself.
+
+#include <exception>
+
+namespace bakjob
+{
+
+class Interrupted : public std::exception
+{
+public:
+    [[nodiscard]] const char *what() const noexcept override { return "interrupted by a signal"; }
+};
+
+// While this lives, the signals are noted. When it goes, whoever handled them before does so again and is
+// given the signal that was noted: by default, that ends the process. One at a time.
+class CatchInterrupts
+{
+public:
+    CatchInterrupts();
+    CatchInterrupts(const CatchInterrupts &) = delete;
+    CatchInterrupts &operator=(const CatchInterrupts &) = delete;
+    ~CatchInterrupts();
+};
+
+bool interrupts_are_caught();
+
+// The signal that was noted; 0 for none.
+int noted_interrupt();
+
+// Throws Interrupted when a signal was noted. Whoever waits calls it when the wait was broken off (EINTR).
+void throw_if_interrupted();
+
+// For the end of a run, which has to wait, too: signals do not throw any more, but after so many seconds
+// every wait does.
+void limit_waits(int seconds);
+
+} // namespace bakjob

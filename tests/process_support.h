@@ -1,0 +1,37 @@
+#pragma once
+
+// A job whose runs wait where they are told to, and a look at what a run left.
+
+#include "soak_support.h"
+
+#include <string>
+#include <vector>
+
+// Where a run can be held up: in the place of a program, a script that touches /tmp/there and then waits,
+// with a child in a session of its own whose parent has gone.
+struct Phase {
+    const char *name;
+    const char *program;
+    std::string script;
+};
+std::vector<Phase> phases();
+
+// The ids of processes that the module has started, and of those that wait for a phase's end.
+std::string left_processes();
+
+// Starts a run with arguments and signals as they are, and waits until it is held up.
+pid_t start_until_there(const std::vector<std::string> &arguments);
+
+// The wait status, and 0 when it has not ended within so many seconds and is killed.
+int status_within(pid_t process, int seconds);
+
+// The fixture of a job "daily" that fetches with snapshots, from a remote side that answers well.
+class Processes : public Holds
+{
+protected:
+    void SetUp() override;
+    void TearDown() override;
+
+    // What an ended run must not leave; empty when all is well.
+    std::string left_files();
+};
