@@ -61,25 +61,26 @@ int status_within(pid_t process, int seconds)
     return 0;
 }
 
-void Processes::SetUp()
-{
-    Holds::SetUp();
-    shell(std::string("cp /bin/cp ") + COPY);
-    fs::create_directories(std::string(SHARE) + "/daily.0");
-    fs::create_directories("/remote/backup/S1_remote_backup/daily/Public");
-    add_job({{"backup_type", "2"}, {"inc_enable", "1"}, {"retry", "3"}, {"retry_interval", "180"}});
-}
-
-void Processes::TearDown()
-{
-    shell("pkill -9 -f '[s]leep 4711'");
-    fs::remove(COPY);
-    Holds::TearDown();
-}
-
-std::string Processes::left_files()
+std::string left_files()
 {
     return shell("ls -d /var/run/bakjob_* /tmp/r_*.passwd /tmp/rsync_bakcup* /tmp/remote_rshareinfo* "
                  "2>/dev/null")
         .output;
+}
+
+JobToHoldUp::JobToHoldUp(const Keys &keys)
+{
+    shell(std::string("cp /bin/cp ") + COPY);
+    fs::create_directories(std::string(SHARE) + "/daily.0");
+    fs::create_directories("/remote/backup/S1_remote_backup/daily/Public");
+    Keys all{{"backup_type", "2"}, {"inc_enable", "1"}, {"retry", "3"}, {"retry_interval", "180"}};
+    for (const auto &[key, value] : keys)
+        all[key] = value;
+    add_job(all);
+}
+
+JobToHoldUp::~JobToHoldUp()
+{
+    shell("pkill -9 -f '[s]leep 4711'");
+    fs::remove(COPY);
 }

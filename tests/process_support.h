@@ -25,13 +25,16 @@ pid_t start_until_there(const std::vector<std::string> &arguments);
 // The wait status, and 0 when it has not ended within so many seconds and is killed.
 int status_within(pid_t process, int seconds);
 
-// The fixture of a job "daily" that fetches with snapshots, from a remote side that answers well.
-class Processes : public Holds
-{
-protected:
-    void SetUp() override;
-    void TearDown() override;
+// What an ended run must not leave; empty when all is well.
+std::string left_files();
 
-    // What an ended run must not leave; empty when all is well.
-    std::string left_files();
+// While this lives: a job "daily" that fetches with snapshots, from a remote side that answers well. When it
+// goes, so does what waits for a phase's end.
+class JobToHoldUp
+{
+public:
+    explicit JobToHoldUp(const Keys &keys = {});
+    JobToHoldUp(const JobToHoldUp &) = delete;
+    JobToHoldUp &operator=(const JobToHoldUp &) = delete;
+    ~JobToHoldUp();
 };

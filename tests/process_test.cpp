@@ -8,9 +8,9 @@
 #include "config/config_lock.h"
 #include "process_support.h"
 
-#include <chrono>
 #include <csignal>
 #include <filesystem>
+#include <optional>
 #include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -20,6 +20,19 @@ namespace fs = std::filesystem;
 
 namespace
 {
+
+class Processes : public Holds
+{
+protected:
+    void SetUp() override
+    {
+        Holds::SetUp();
+        job_.emplace();
+    }
+
+private:
+    std::optional<JobToHoldUp> job_;
+};
 
 class Killed : public Processes
 {
@@ -116,7 +129,7 @@ TEST_F(Killed, ARunThatStartsMeanwhileKeepsItsPidFile)
         lock.reset();
         EXPECT_EQ(wait_for(killer), 0);
         EXPECT_EQ(read_file(PID_FILE), std::to_string(run) + "\n") << before;
-        EXPECT_EQ(wait_for(start({"-r", "daily"})), 255);
+        EXPECT_EQ(WEXITSTATUS(status_within(start({"-r", "daily"}), 10)), 255) << "beside another";
         write_file("/tmp/go", "");
         EXPECT_EQ(wait_for(run), 0);
         EXPECT_EQ(job_key(1, "state"), "2");
