@@ -36,23 +36,23 @@ TEST_F(Guard, ThePidFileIsMadeByOneRunAlone)
     const JobName name = named("it's $x");
     const std::string path = "/var/run/bakjob_it's $x.pid";
     EXPECT_TRUE(rsync_pid_file_absent(name));
-    const UniqueFd own = rsync_write_pid_file(name);
-    ASSERT_TRUE(own);
+    const PidFile own = rsync_write_pid_file(name);
+    ASSERT_TRUE(own.handle);
     EXPECT_EQ(read_file(path), std::to_string(getpid()) + "\n");
     EXPECT_EQ(octal_mode(path), "644");
-    EXPECT_FALSE(rsync_write_pid_file(name));
+    EXPECT_FALSE(rsync_write_pid_file(name).handle);
     EXPECT_EQ(errno, EEXIST);
-    EXPECT_EQ(rsync_remove_pid_file(name, own), 0);
-    EXPECT_EQ(rsync_remove_pid_file(name, own), -1);
-    const UniqueFd later = rsync_write_pid_file(name);
+    EXPECT_EQ(rsync_remove_pid_file(own), 0);
+    EXPECT_EQ(rsync_remove_pid_file(own), -1);
+    const PidFile later = rsync_write_pid_file(name);
     const UniqueFd neighbours(open(path.c_str(), O_RDONLY));
     ASSERT_EQ(flock(neighbours.get(), LOCK_EX), 0);
-    EXPECT_EQ(rsync_remove_pid_file(name, own), -1) << "another run's";
-    EXPECT_EQ(rsync_remove_pid_file(name, later), 0) << "although somebody else locks it";
+    EXPECT_EQ(rsync_remove_pid_file(own), -1) << "another run's";
+    EXPECT_EQ(rsync_remove_pid_file(later), 0) << "although somebody else locks it";
 
     fs::create_symlink("/tmp/target", path);
     EXPECT_FALSE(rsync_pid_file_absent(name)) << "a dangling link stands there too";
-    EXPECT_FALSE(rsync_write_pid_file(name));
+    EXPECT_FALSE(rsync_write_pid_file(name).handle);
     EXPECT_FALSE(exists("/tmp/target"));
 }
 

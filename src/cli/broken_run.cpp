@@ -1,7 +1,6 @@
 #include "cli/broken_run.h"
 
 #include "cli/job_state.h"
-#include "cli/process_guard.h"
 #include "cli/run_processes.h"
 #include "cli/source_folders.h"
 #include "common/debug_log.h"
@@ -32,7 +31,7 @@ void attempt(const Step &step)
 
 } // namespace
 
-void rsync_end_broken_run(const JobName &job, const UniqueFd &pid_file) noexcept
+void rsync_end_broken_run(const JobName &job, const PidFile &pid_file) noexcept
 {
     if (noted_interrupt() != 0) DebugLog("ERROR: interrupted by signal %d\n", noted_interrupt());
     attempt([] { RunProcesses(getpid(), true).end(GRACE); });
@@ -43,7 +42,7 @@ void rsync_end_broken_run(const JobName &job, const UniqueFd &pid_file) noexcept
     attempt([&] { unlink(password_file(job).c_str()); });
     attempt([&] { unlink(remote_config_copy(job).c_str()); });
     attempt([&] { rsync_remove_progress(job); });
-    attempt([&] { rsync_remove_pid_file(job, pid_file); });
+    rsync_remove_pid_file(pid_file);
 }
 
 } // namespace bakjob

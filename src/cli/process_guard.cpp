@@ -87,29 +87,30 @@ bool rsync_pid_file_absent(const JobName &job)
     return lstat(pid_file(job).c_str(), &status) != 0;
 }
 
-UniqueFd rsync_write_pid_file(const JobName &job)
+PidFile rsync_write_pid_file(const JobName &job)
 {
-    const std::string path = pid_file(job);
-    const std::string text = format_text("%d\n", getpid());
-    UniqueFd file = link_pid_file(path, text);
-    if (file || errno == EEXIST) return file;
-    file = create_file(path, PID_FILE_MODE);
-    if (!file || write_all(file.get(), text)) return file;
+    PidFile made{pid_file(job), UniqueFd(), getpid(), true};
+    const std::string text = format_text("%d\n", made.process);
+    made.handle = link_pid_file(made.path, text);
+    if (made.handle || errno == EEXIST) return made;
+    made.handle = create_file(made.path, PID_FILE_MODE);
+    if (!made.handle || write_all(made.handle.get(), text)) return made;
     const int why = errno;
-    unlink(path.c_str());
+    unlink(made.path.c_str());
+    made.handle.reset();
     errno = why;
-    return UniqueFd();
+    return made;
 }
 
 PidFile rsync_read_pid_file(const JobName &job)
 {
-    const std::string path = pid_file(job);
-    PidFile read{open_own_file(path, O_RDONLY), 0, false};
+    PidFile read{pid_file(job), UniqueFd(), 0, false};
+    read.handle = open_own_file(read.path, O_RDONLY);
     if (read.handle) {
         read.process = process_id_in(read.handle.get());
         read.is_run = read.process > 0 && runs_job(read.process, job.text());
     } else {
-        read.handle = UniqueFd(open(path.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC)); // whatever it is
+        read.handle = UniqueFd(open(read.path.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC)); // whatever it is
     }
     return read;
 }
@@ -120,12 +121,11 @@ pid_t rsync_running_process(const JobName &job)
     return file.is_run ? file.process : 0;
 }
 
-int rsync_remove_pid_file(const JobName &job, const UniqueFd &handle)
+int rsync_remove_pid_file(const PidFile &file) noexcept
 {
-    if (!handle) return -1;
-    const std::string path = pid_file(job);
-    lock_briefly(handle.get());
-    return is_at(path, handle.get()) ? unlink(path.c_str()) : -1;
+    if (!file.handle) return -1;
+    lock_briefly(file.handle.get());
+    return is_at(file.path, file.handle.get()) ? unlink(file.path.c_str()) : -1;
 }
 
 std::string rsync_ps_command()

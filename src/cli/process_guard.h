@@ -16,24 +16,26 @@ namespace bakjob
 // running job until rsync_kill_job removes it.
 bool rsync_pid_file_absent(const JobName &job);
 
-// Makes the pid file, with this process's id; nobody ever sees it without. The handle tells it from a later
-// one. No handle (errno) when it cannot be made; EEXIST: another run was quicker.
-UniqueFd rsync_write_pid_file(const JobName &job);
-
-// What a pid file says, and which file it was.
+// A pid file: what it says, and which file it is, so that a later one is told from it.
 struct PidFile {
+    std::string path;
     UniqueFd handle; // none: there was no file
     pid_t process;   // 0: the file holds no process id
     bool is_run;     // the process is one that runs the job, by its command line
 };
+
+// Makes the pid file, with this process's id; nobody ever sees it without. No handle (errno) when it cannot
+// be made; EEXIST: another run was quicker.
+PidFile rsync_write_pid_file(const JobName &job);
+
 PidFile rsync_read_pid_file(const JobName &job);
 
 // The process that the job's pid file names, if it is one that runs the job; else 0, also for another process
 // that has got its number.
 pid_t rsync_running_process(const JobName &job);
 
-// Removes the pid file if it still is the one that the handle is of. 0 when it is gone by that, else -1.
-int rsync_remove_pid_file(const JobName &job, const UniqueFd &handle);
+// Removes the file if it still stands at its path. 0 when it is gone by that, else -1. Takes no memory.
+int rsync_remove_pid_file(const PidFile &file) noexcept;
 
 // The listing of processes that works here: "ps -ww" or "ps".
 std::string rsync_ps_command();

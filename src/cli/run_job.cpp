@@ -54,14 +54,14 @@ bool is_due(const RsyncJob &job, bool force)
     return job.inc_enable == 1 && rsync_list_snapshots(job.job_name) != 0;
 }
 
-UniqueFd take_pid_file(const JobName &name)
+PidFile take_pid_file(const JobName &name)
 {
-    UniqueFd file = rsync_write_pid_file(name);
-    if (file) return file;
+    PidFile file = rsync_write_pid_file(name);
+    if (file.handle) return file;
     if (errno == EEXIST) {
         DebugLog("ERROR: rsync backup is running!\n");
     } else {
-        DebugLog("ERROR: pid file [%s]: %s\n", pid_file(name).c_str(), std::strerror(errno));
+        DebugLog("ERROR: pid file [%s]: %s\n", file.path.c_str(), std::strerror(errno));
     }
     return file;
 }
@@ -123,7 +123,7 @@ void clear_dead_run(const JobName &name)
     const PidFile file = rsync_read_pid_file(name);
     if (file.process == 0 || is_running(file.process)) return;
     RunProcesses(file.process, false).end(0);
-    rsync_remove_pid_file(name, file.handle);
+    rsync_remove_pid_file(file);
 }
 
 } // namespace
@@ -157,8 +157,8 @@ bool rsync_run_job(const std::string &job_name, bool force, bool &outcome)
     if (is_restore_run()) job->backup_type = BACKUP_PULL;
 
     const CatchInterrupts interrupts;
-    const UniqueFd pid_file = take_pid_file(*name);
-    if (!pid_file) return false;
+    const PidFile pid_file = take_pid_file(*name);
+    if (!pid_file.handle) return false;
     try {
         rsync_set_job_state(job_name, JOB_STARTING);
         if (!run_folders(*job, *name)) outcome = false;
@@ -170,7 +170,7 @@ bool rsync_run_job(const std::string &job_name, bool force, bool &outcome)
         rsync_end_broken_run(*name, pid_file);
         throw;
     }
-    rsync_remove_pid_file(*name, pid_file);
+    rsync_remove_pid_file(pid_file);
     return true;
 }
 
@@ -189,7 +189,7 @@ void rsync_kill_job(const std::string &job_name)
     if (started) started->end(0);
     rsync_set_job_state(job_name, JOB_KILLED);
     rsync_remove_progress(*name);
-    rsync_remove_pid_file(*name, file.handle);
+    rsync_remove_pid_file(file);
     clear_dead_run(*name);
 }
 
