@@ -109,8 +109,7 @@ void rsync_record_interruption(const std::string &job_name)
             rsync_free_jobs();
             rsync_set_job_state(job_name, JOB_INTERRUPTED);
             return;
-        } catch (const std::exception &why) {
-            DebugLog("ERROR: state %d of [%s]: %s\n", JOB_INTERRUPTED, job_name.c_str(), why.what());
+        } catch (const std::exception &) { // somebody holds the lock, or there is no memory
         }
     }
     char now[JOB_TIME_SIZE] = "";
