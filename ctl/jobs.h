@@ -17,6 +17,9 @@ struct StoredJob {
     std::vector<ScheduleEntry> schedule;
 };
 
+// Loads the list; Failure when a job may be left out.
+void load_jobs();
+
 std::vector<StoredJob> read_jobs();
 
 // Failure when there is no job of that name.

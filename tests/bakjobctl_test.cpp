@@ -289,7 +289,7 @@ TEST_F(Ctl, ARunIsFollowedToItsEnd)
 {
     ASSERT_TRUE(says(add("daily"), 0, ""));
     write_file("/mnt/HD/HD_a2/Public/film", std::string(1'500'000, 'x'));
-    const Fake slow("/usr/sbin/rsync", "case \"$*\" in --server* | *--dry-run* | *::) ;; "
+    const Fake slow("/usr/sbin/rsync", "case \"$*\" in --server* | *--dry-run*) ;; *::) sleep 2 ;; "
                                        "*) set -- --bwlimit=1000 \"$@\" ;; esac\n"
                                        "exec /usr/sbin/rsync.real \"$@\"\n");
     const Ran lines = shell("/usr/sbin/bakjob -r daily & /usr/sbin/bakjobctl watch daily; wait");

@@ -66,7 +66,7 @@ TEST_F(Folders, AListIsSplitAndWhatDoesNotFitIsCounted)
 {
     const auto split = [](const std::string &list, bool cut = false) {
         RsyncJob job{};
-        if (cut) job.cut_fields = ~0U;
+        if (cut) job.whole_texts = std::make_shared<WholeTexts>(WholeTexts{{"local_path", list + "more"}});
         snprintf(job.local_path, sizeof job.local_path, "%s", list.c_str());
         FolderTable table{};
         rsync_split_folders(job, table);
