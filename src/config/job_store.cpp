@@ -51,16 +51,12 @@ private:
     int key_;
 };
 
-bool has_item(int item)
+// What the store answers for an item: negative when there is none. Paths with a number are read from the tree
+// that the count came from, so that one which could not be read does not seem whole by being read again.
+int look_for_item(int item)
 {
     char start[2] = "";
-    return xml_get_str(format_text("%s/item:%d", JOBS, item).c_str(), sizeof start, start) >= 0;
-}
-
-bool is_unreadable()
-{
-    char start[2] = "";
-    return xml_get_str(JOB_COUNT, sizeof start, start) == XML_UNREADABLE;
+    return xml_get_str(format_text("%s/item:%d", JOBS, item).c_str(), sizeof start, start);
 }
 
 const char *text_to_save(const RsyncJob &job, const JobField &field)
@@ -127,8 +123,9 @@ public:
             }
         }
         if (missing_ >= LONGEST_GAP) return GAP;
-        if (failure_ == nullptr && has_item(item)) return WRONG_COUNT;
-        return failure_ == nullptr && is_unreadable() ? UNREADABLE : failure_;
+        const int behind = look_for_item(item);
+        if (behind == XML_UNREADABLE) return UNREADABLE;
+        return behind >= 0 ? WRONG_COUNT : failure_;
     }
 
 private:
