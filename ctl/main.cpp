@@ -1,6 +1,7 @@
 // bakjobctl: backup jobs for people. The words of the command line, and which function they mean.
 
 #include "commands.h"
+#include "common/process_start.h"
 #include "failure.h"
 
 #include <CLI/CLI.hpp>
@@ -101,6 +102,7 @@ int run(int argc, char **argv)
 
 int main(int argc, char **argv)
 {
+    bakjob::rsync_prepare_process();
     try {
         const int status = run(argc, argv);
         if (std::fflush(stdout) == 0 && std::ferror(stdout) == 0) return status;
