@@ -31,8 +31,14 @@ TEST_F(Start, ClosedHandlesAreNobodysFiles)
 {
     const std::string closed = " <&- >&- 2>&-";
     unlink(LOCK);
-    EXPECT_EQ(shell("/usr/sbin/bakjob -d -r daily" + closed).status, 0);
+    {
+        const Fake rsync("/usr/sbin/rsync",
+                         "for i in 0 1 2; do [ -e /proc/$$/fd/$i ] || echo $i >>/tmp/closed; done\n"
+                         "exec /usr/sbin/rsync.real \"$@\"\n");
+        EXPECT_EQ(shell("/usr/sbin/bakjob -d -r daily" + closed).status, 0);
+    }
     EXPECT_EQ(job_key(1, "state"), "2");
+    EXPECT_FALSE(exists("/tmp/closed")) << "a transfer would write its messages into files of its own";
     EXPECT_EQ(read_file(LOCK), "");
     EXPECT_EQ(read_file("/remote/backup/S123_remote_backup/daily/Public/a"), "a");
     unlink(LOCK);
