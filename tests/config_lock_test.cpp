@@ -149,6 +149,7 @@ TEST_F(ConfigLock, IsExclusive)
     EXPECT_TRUE(is_lock(LOCK));
     const UniqueFd other(open(LOCK.c_str(), O_RDONLY));
     EXPECT_NE(flock(other.get(), LOCK_EX | LOCK_NB), 0);
+    EXPECT_FALSE(exists(LOCK_GUARD_FILE)) << "only where there is something to guard against";
     EXPECT_FALSE(rsync_lock_config("/no/such/folder/lock"));
     EXPECT_EQ(errno, ENOENT);
 }
@@ -183,6 +184,13 @@ TEST_F(ConfigLock, WhateverElseIsThereGivesWay)
         EXPECT_FALSE(exists("/tmp/made"));
     }
     EXPECT_EQ(octal_mode(LOCK_GUARD_FILE), "600");
+
+    SetUp();
+    shell(as_neighbour("mkdir " + LOCK));
+    const ReadOnly no_guard("/run");
+    EXPECT_FALSE(rsync_lock_config(LOCK.c_str()));
+    EXPECT_EQ(errno, EROFS);
+    EXPECT_TRUE(moved_aside().empty());
 }
 
 TEST_F(ConfigLock, NobodyWaitsForANeighboursFile)

@@ -36,6 +36,11 @@ bool is_own_file(const struct stat &status)
     return S_ISREG(status.st_mode) && status.st_uid == geteuid();
 }
 
+bool is_lock(const struct stat &status)
+{
+    return is_own_file(status) && status.st_nlink == 1;
+}
+
 bool is_still_at(const char *path, int file)
 {
     struct stat there = {};
@@ -79,11 +84,11 @@ UniqueFd open_lock(const char *path)
 }
 
 // Held while something is moved aside: two who do that at once would move away each other's new lock. It
-// lies where nobody else can write.
-UniqueFd take_guard()
+// lies where nobody else can write, and from the first time on it is there.
+UniqueFd take_guard(bool make)
 {
-    UniqueFd guard = create_file(LOCK_GUARD_FILE, LOCK_MODE);
-    if (!guard) guard = open_own_file(LOCK_GUARD_FILE, O_RDONLY);
+    UniqueFd guard = make ? create_file(LOCK_GUARD_FILE, LOCK_MODE) : UniqueFd();
+    if (!guard && (!make || errno == EEXIST)) guard = open_own_file(LOCK_GUARD_FILE, O_RDONLY);
     if (guard && !wait_for_flock(LOCK_GUARD_FILE, guard.get())) guard.reset();
     return guard;
 }
@@ -111,11 +116,12 @@ bool move_aside(const char *path)
 // whoever moves it aside for that waits for the lock first.
 UniqueFd make_lock(const char *path, milliseconds &patience)
 {
-    const UniqueFd guard = take_guard();
     struct stat there = {};
+    const bool in_the_way = lstat(path, &there) == 0 && !is_lock(there);
+    const UniqueFd guard = take_guard(in_the_way);
     UniqueFd linked;
     if (lstat(path, &there) == 0) {
-        if (is_own_file(there) && there.st_nlink == 1) return open_lock(path); // made by another meanwhile
+        if (is_lock(there)) return open_lock(path); // made by another meanwhile
         if (!guard) return UniqueFd();
         if (is_own_file(there)) linked = wait_for_linked(path, patience);
         if (!move_aside(path)) return UniqueFd();
