@@ -253,11 +253,11 @@ TEST_F(ConfigLock, AnHonestHolderOfOneWithTwoNamesIsWaitedFor)
     EXPECT_TRUE(is_lock(LOCK));
 
     // A daemon holds a file of its own for ever.
+    fs::remove("/tmp/go");
     const Child daemon(holding([] {
         write_file("/tmp/daemon.pid", "1");
         return as_older_programs_do("/tmp/daemon.pid");
     }));
-    fs::remove("/tmp/go");
     ASSERT_TRUE(eventually([&] {
         return !shell("grep 'FLOCK.*:'$(stat -c %i /tmp/daemon.pid)' ' "
                       "/proc/locks")

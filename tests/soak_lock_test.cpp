@@ -3,8 +3,9 @@
 #include "common/job_files.h"
 #include "soak_support.h"
 
+#include <algorithm>
+#include <array>
 #include <csignal>
-#include <cstdio>
 #include <set>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -92,9 +93,9 @@ TEST_F(Holds, NoChangeIsLostToANeighbour)
                 _exit(0);
             }
             if (neighbour.act == plant_a_folder) wait_for(rival);
-            std::vector<pid_t> adding;
-            for (int number = 0; number < CHANGES; ++number)
-                adding.push_back(add_in_background(number));
+            std::array<pid_t, CHANGES> adding{};
+            std::generate(adding.begin(), adding.end(),
+                          [number = 0]() mutable { return add_in_background(number++); });
             int refused = 0;
             for (const pid_t one : adding)
                 refused += wait_for(one) == 0 ? 0 : 1;
