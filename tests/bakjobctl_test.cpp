@@ -303,7 +303,9 @@ TEST_F(Ctl, ARunIsFollowedToItsEnd)
         shell("/usr/sbin/bakjob -r daily & script -qec '/usr/sbin/bakjobctl watch daily' /dev/null; wait");
     EXPECT_TRUE(says(drawn, 0, ".] folder 1/1  /mnt/HD/HD_a2/Public    0 %"));
     shell("rm -r /remote/backup/S123*/daily/Public");
-    const Ran restore = shell("/usr/sbin/bakjob -i /mnt -r daily & /usr/sbin/bakjobctl watch daily; "
+    const Ran restore = shell("/usr/sbin/bakjob -i /mnt -r daily & "
+                              "until [ -e /var/run/bakjob_daily.pid ]; do sleep 0.01; done; "
+                              "/usr/sbin/bakjobctl watch daily; "
                               "status=$?; wait; exit $status");
     EXPECT_TRUE(says(restore, 1, "daily: restore failed"));
 }

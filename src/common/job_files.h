@@ -14,6 +14,8 @@ namespace bakjob
 
 inline constexpr const char *CONFIG_FILE = "/etc/NAS_CFG/config.xml";
 inline constexpr const char *CONFIG_LOCK_FILE = "/tmp/rsync_write_conf.lock";
+// Locked by whoever replaces what stands at a lock's name (config/config_lock.h).
+inline constexpr const char *LOCK_GUARD_FILE = "/var/run/bakjob_lock.guard";
 inline constexpr const char *SERIAL_FILE = "/tmp/kv_serial.txt";
 inline constexpr const char *TRACE_FILE = "/tmp/rsync_debug";
 

@@ -50,9 +50,10 @@ int read_job(const std::string &job_name, const std::function<void(const RsyncJo
 
 } // namespace
 
-JobChange rsync_change_jobs(const std::function<bool()> &change)
+JobChange rsync_change_jobs(const std::function<bool()> &change, WithoutLock without_lock)
 {
     const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
+    if (!lock && without_lock == WithoutLock::REFUSE) return JobChange::NOT_LOCKED;
     if (!rsync_load_jobs()) {
         rsync_free_jobs();
         return JobChange::NOT_LOADED;
