@@ -166,9 +166,11 @@ TEST_F(HoldsThroughFaults, SystemCallsThatFail)
             shell(trace + " -o /var/tmp/calls /usr/sbin/" + command.words);
             const int all = number_in(shell("grep -c '^" + call + "(' /var/tmp/calls").output);
             for (int n = all; n > 0; n -= reads ? 1 : rounds(std::max(1, all / 2), 1)) {
-                const char *const error = ERRORS[static_cast<std::size_t>(turn++) % ERRORS.size()];
-                meet(command, trace + " -o /dev/null -e inject=" + call + ":error=" + error +
-                                  ":when=" + std::to_string(n));
+                for (int i = 0; i < rounds(1, ERRORS.size()); ++i) {
+                    const char *const error = ERRORS[static_cast<std::size_t>(turn++) % ERRORS.size()];
+                    meet(command, trace + " -o /dev/null -e inject=" + call + ":error=" + error +
+                                      ":when=" + std::to_string(n));
+                }
             }
         }
     }
