@@ -185,6 +185,7 @@ TEST_F(Ctl, ACheckFindsWhatARunWouldMeetHere)
         {{}, "true & echo $! >/var/run/bakjob_daily.pid", 1, "rm /var/run/bakjob_daily.pid and bakjob -a"},
         {{}, "echo $PPID >/var/run/bakjob_daily.pid", 1, "run: one died"}, // another process has the number
         {{}, "printf 'S\\n1' >/tmp/kv_serial.txt", 1, "line break"},
+        {{}, "chmod o+w /tmp/kv_serial.txt", 1, "problem  /tmp/kv_serial.txt: it is not a plain file"},
         {{{"inc_enable", "1"}, {"backup_type", "2"}},
          "ln -s /etc /mnt/HD/HD_a2/Public/daily.2",
          1,
