@@ -167,7 +167,7 @@ void rsync_write_progress(const JobName &job, const std::string &folder, int ind
 
 void rsync_remove_progress(const JobName &job)
 {
-    unlink(progress_file(job).c_str());
+    std::remove(progress_file(job).c_str());
 }
 
 int rsync_read_serial(char (&serial)[SERIAL_SIZE])

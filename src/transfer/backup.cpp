@@ -18,6 +18,7 @@
 #include "transfer/snapshot_mark.h"
 
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
 #include <fcntl.h>
 #include <optional>
@@ -99,7 +100,7 @@ int transfer_with_retries(const JobName &job_name, const RsyncJob &job, const st
             if (!local.newest.empty() && !take_mark_away(local.newest)) return LOCAL_SIDE_REFUSED;
             code = exit_code(run_shell(with_dump_size(command)));
         } else {
-            unlink(transfer_size_file(job_name).c_str());
+            std::remove(transfer_size_file(job_name).c_str());
         }
         --attempts_left;
         if (code == 0 || code == RSYNC_PARTIAL || attempts_left <= 0) return code;
@@ -121,7 +122,7 @@ std::optional<std::string> rsync_transfer_command(const RsyncJob &job)
 
 bool rsync_write_password_file()
 {
-    unlink(CurrentJob.rsync_pwd_file);
+    std::remove(CurrentJob.rsync_pwd_file);
     char password[PASSWORD_SIZE] = "";
     const bool encoded = CurrentJob.pwd_encoded != 0;
     const bool wants_plain = CurrentJob.server_type == SERVER_ANY;
@@ -167,7 +168,7 @@ BackupResult rsync_run_backup(const JobName &job_name, RsyncJob &job)
     if (is_directory(job.local_path)) local.folders.emplace_back(job.local_path);
     const auto command = rsync_transfer_command(job);
     if (!command) return BACKUP_FAILED;
-    unlink(transfer_file(job_name).c_str());
+    std::remove(transfer_file(job_name).c_str());
     if (keeps_snapshots(job)) {
         DebugLog("run rsync_snapshot_rotate() %s %d\n", job.local_path, job.inc_number);
         if (!are_folders(local.folders)) return BACKUP_FAILED;
