@@ -1,6 +1,5 @@
 // What must hold however often it is tried: hostile values, kills in mid-save, races for one job, kills of
-// runs, files placed beforehand, remote sides that misbehave. A few rounds each here; with BAKJOB_SOAK in the
-// environment many, and a line per subject in the file that it names (see scripts/soak).
+// runs, files placed beforehand, remote sides that misbehave.
 
 #include "cli/job_state.h"
 #include "common/debug_log.h"
@@ -10,7 +9,7 @@
 #include "config/job_store.h"
 #include "platform/config_store.h"
 #include "remote/discovery.h"
-#include "support.h"
+#include "soak_support.h"
 
 #include <algorithm>
 #include <arpa/inet.h>
@@ -19,7 +18,6 @@
 #include <cstring>
 #include <fcntl.h>
 #include <filesystem>
-#include <fstream>
 #include <random>
 #include <sys/resource.h>
 #include <sys/socket.h>
@@ -33,77 +31,7 @@ namespace fs = std::filesystem;
 namespace
 {
 
-constexpr const char *SHARE = "/mnt/HD/HD_a2/Public";
 constexpr const char *CONFIG = "/etc/NAS_CFG/config.xml";
-
-const char *soak_table()
-{
-    return std::getenv("BAKJOB_SOAK");
-}
-
-int rounds(int here, int soaking)
-{
-    return soak_table() == nullptr ? here : soaking;
-}
-
-// Starts the program; its output goes to a file.
-pid_t start(const std::vector<std::string> &arguments)
-{
-    const pid_t child = fork();
-    if (child != 0) return child;
-    const int output = open("/tmp/output", O_WRONLY | O_CREAT | O_TRUNC, 0600);
-    dup2(output, STDOUT_FILENO);
-    dup2(output, STDERR_FILENO);
-    std::vector<char *> argv{const_cast<char *>("bakjob")};
-    for (const std::string &argument : arguments)
-        argv.push_back(const_cast<char *>(argument.c_str()));
-    argv.push_back(nullptr);
-    execv("/usr/sbin/bakjob", argv.data());
-    _exit(127);
-}
-
-int wait_for(pid_t child)
-{
-    int status = 0;
-    waitpid(child, &status, 0);
-    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
-}
-
-// Runs the program with arguments that no shell sees. Its trace.
-std::string traced(std::vector<std::string> arguments)
-{
-    arguments.insert(arguments.begin(), "-d");
-    wait_for(start(arguments));
-    return read_file("/tmp/output");
-}
-
-} // namespace
-
-class Holds : public Appliance
-{
-protected:
-    void SetUp() override
-    {
-        Appliance::SetUp();
-        add_share("Public", SHARE);
-        write_file(std::string(SHARE) + "/file", "x");
-        write_file("/tmp/kv_serial.txt", "S1");
-        shell("mkdir -p ~root/.ssh"); // as a first ssh login would
-        fs::create_directories("/remote/backup/S1_remote_backup/daily");
-        fs::create_directories("/remote/data/S1_remote_backup/daily");
-    }
-
-    // A row of the soak's table, and the verdict.
-    static void expect_none_of(int tries, int failures, const std::string &what)
-    {
-        EXPECT_EQ(failures, 0) << what;
-        if (soak_table() != nullptr)
-            std::ofstream(soak_table(), std::ios::app) << what << '\t' << tries << '\t' << failures << '\n';
-    }
-};
-
-namespace
-{
 
 // Names and contents of everything outside of a job's own places.
 std::string elsewhere()
