@@ -4,6 +4,7 @@
 #include "transfer/snapshot_mark.h"
 
 #include <filesystem>
+#include <sys/xattr.h>
 
 using namespace bakjob;
 namespace fs = std::filesystem;
@@ -49,6 +50,15 @@ protected:
     }
 
     static Ran run() { return bakjob_program("-d -r weekly"); }
+
+    static void make_row()
+    {
+        for (int number = 0; number < 4; ++number) {
+            shell(std::string("cp -r ") + REMOTE + " " + snapshot(number));
+            mark_whole(snapshot(number));
+        }
+        ASSERT_EQ(row(), "0w 1w 2w 3w");
+    }
 
     // "0w 1 2w": which there are, and which of them are marked.
     static std::string row()
@@ -113,15 +123,31 @@ TEST_F(SnapshotMark, IsNotLeftByAStepThatFailed)
     };
     for (const Case &c : cases) {
         SetUp();
-        for (int runs = 0; runs < 4; ++runs)
-            run();
-        ASSERT_EQ(row(), "0w 1w 2w 3w");
+        make_row();
         const InFront broken(c.program, c.script + "exec /bin/" + c.program + " \"$@\"\n");
         const Ran ran = run();
         EXPECT_EQ(row(), c.row) << c.program << c.script << ran.output;
         EXPECT_NE(ran.output.find("ERROR: snapshots: "), std::string::npos) << ran.output;
         EXPECT_NE(ran.output.find(c.trace), std::string::npos) << ran.output;
         EXPECT_EQ(job_key(1, "state"), "2") << "the newest is whole";
+        const bool copied = lgetxattr(snapshot(1).c_str(), SNAPSHOT_MARK, nullptr, 0) >= 0;
+        EXPECT_FALSE(c.program == "cp" && copied) << "nor that of the source";
+    }
+}
+
+TEST_F(SnapshotMark, IsNotLeftWhenTheRunDiesWithItsCommand)
+{
+    const std::string die = "kill -9 $(cat /var/run/bakjob_weekly.pid); exit\n";
+    const std::map<std::string, std::pair<std::string, std::string>> cases = {
+        {"rm", {"/bin/rm -r $2/sub; ", "0w 1w 2w 3"}},
+        {"mv", {"cp -a $1 $2; /bin/rm -r $1/sub; ", "0w 1w 2 3"}}, // between file systems
+        {"cp", {"/bin/cp \"$@\"; rm $3/sub/b; ", "0w 1 2w 3w"}}};
+    for (const auto &[program, script] : cases) {
+        SetUp();
+        make_row();
+        const InFront deadly(program, script.first + die);
+        run();
+        EXPECT_EQ(row(), script.second) << program;
     }
 }
 

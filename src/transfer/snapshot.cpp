@@ -62,7 +62,6 @@ bool run_step(const Step &step)
     const bool was_whole = is_marked_whole(step.from);
     if (!step.copies && !take_mark_away(step.from)) return false;
     bool in_the_way = !step.to.empty() && exists(step.to);
-    if (in_the_way && !take_mark_away(step.to)) return false;
     const bool holds_its_name = exists(name_inside(step.from, step));
 
     const int code = run_command(step);
