@@ -38,6 +38,7 @@ inline constexpr const char *DISCOVERY_LOCK_FILE = "/tmp/remote_rinfo.lock";
 // Name of a snapshot folder inside the job's local folder: the job's name (or "backup") and the number, 0 the
 // newest, with a full stop between them.
 std::string snapshot_name(std::string_view job_name, std::int64_t number);
+std::string snapshot_path(std::string_view folder, std::string_view job_name, std::int64_t number);
 
 // Whether a folder entry is a snapshot of the job by its name alone: anything may follow the full stop.
 bool is_snapshot_name(std::string_view job_name, std::string_view entry);

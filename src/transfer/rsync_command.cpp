@@ -75,11 +75,6 @@ std::optional<std::string> options(const RsyncJob &job)
     return text;
 }
 
-std::string snapshot_path(const RsyncJob &job, std::int64_t number)
-{
-    return std::string(job.local_path) + '/' + snapshot_name(job.job_name, number);
-}
-
 // User, host and the colons: everything in front of the remote path.
 std::string endpoint(const RsyncJob &job)
 {
@@ -104,9 +99,10 @@ std::optional<std::string> rsync_build_command(const RsyncJob &job)
     const bool pull = !recover && job.backup_type != BACKUP_PUSH;
     std::string local = job.local_path + slash;
     if (recover) {
-        local = snapshot_path(job, std::int64_t{run_options.recover_seq} - 1) + '/';
+        const std::int64_t number = std::int64_t{run_options.recover_seq} - 1;
+        local = snapshot_path(job.local_path, job.job_name, number) + '/';
     } else if (job.backup_type == BACKUP_PULL && job.inc_enable == 1) {
-        local = snapshot_path(job, 0);
+        local = snapshot_path(job.local_path, job.job_name, 0);
     }
     const auto local_end = shell_path("local_path", local);
     if (!local_end) return std::nullopt;
