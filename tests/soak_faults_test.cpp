@@ -34,6 +34,8 @@ constexpr std::array COMMANDS = {
 };
 
 constexpr const char *COPY = "/remote/backup/S1_remote_backup/one/Public/file";
+// Where a run copies to that cannot read the serial text.
+constexpr const char *COPY_WITHOUT_SERIAL = "/remote/backup/_remote_backup/one/Public/file";
 constexpr const char *UNRECORDED = "/var/run/bakjob_one.unrecorded";
 constexpr std::array KEPT = {STORE, FLASH, CRON};
 using Contents = std::array<std::string, KEPT.size()>;
@@ -87,7 +89,8 @@ protected:
     static void put_back()
     {
         shell("rm -rf /etc/NAS_CFG/* /var/lib/device_flash/* /var/run/bakjob_* /tmp/r_* /tmp/rsync_* "
-              "/remote/backup/S1_remote_backup/one/*; mkdir -p /remote/backup/S1_remote_backup/one; "
+              "/remote/backup/S1_remote_backup/one/* /remote/backup/_remote_backup; mkdir -p "
+              "/remote/backup/S1_remote_backup/one; "
               "cp -a /var/tmp/kept/store /etc/NAS_CFG/config.xml; "
               "cp -a /var/tmp/kept/flash /var/lib/device_flash/config.xml; "
               "cp -a /var/tmp/kept/cron /etc/cron.d/device_scheduler");
@@ -114,7 +117,8 @@ protected:
         if (now[0] == before_[0] && now[1] != before_[1]) return "flash is ahead of the store";
         if (command.by_status && ran.status == 0 && now != after_) return "success was told";
         const bool done = read_file(STORE).find("<state>2</state>") != std::string::npos;
-        if (done && !exists(UNRECORDED) && !exists(COPY)) return "a success was recorded";
+        const bool copied = exists(COPY) || exists(COPY_WITHOUT_SERIAL);
+        if (done && !exists(UNRECORDED) && !copied) return "a success was recorded";
         return "";
     }
 

@@ -8,6 +8,7 @@
 #include "platform/device.h"
 
 #include <array>
+#include <cerrno>
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
@@ -91,7 +92,10 @@ struct SerialFile {
 SerialFile read_serial_file()
 {
     struct stat status = {};
-    if (lstat(SERIAL_FILE, &status) != 0) return {};
+    if (lstat(SERIAL_FILE, &status) != 0) {
+        return {std::nullopt,
+                errno == ENOENT ? "" : std::string("it cannot be read: ") + std::strerror(errno)};
+    }
     UniqueFd opened = open_own_file(SERIAL_FILE, O_RDONLY);
     const bool others_write =
         opened && (fstat(opened.get(), &status) != 0 || (status.st_mode & (S_IWGRP | S_IWOTH)) != 0);

@@ -165,7 +165,9 @@ BackupResult rsync_run_backup(const JobName &job_name, RsyncJob &job)
     if (const auto failure = check_remote_side(job_name, job)) return *failure;
 
     // The command names the contents of a folder, and those of one behind a link just as well.
-    if (is_directory(job.local_path)) local.folders.emplace_back(job.local_path);
+    const auto names_folder = is_folder(job.local_path);
+    if (!names_folder) return BACKUP_FAILED;
+    if (*names_folder) local.folders.emplace_back(job.local_path);
     const auto command = rsync_transfer_command(job);
     if (!command) return BACKUP_FAILED;
     std::remove(transfer_file(job_name).c_str());

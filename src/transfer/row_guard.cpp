@@ -7,10 +7,32 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
+#include <optional>
 #include <sys/stat.h>
 
 namespace bakjob
 {
+
+namespace
+{
+
+constexpr mode_t NOTHING = 0;
+
+// The type bits of what stands at the path, or NOTHING; none (errno) when that cannot be told.
+std::optional<mode_t> type_at(const std::string &path)
+{
+    struct stat status = {};
+    if (lstat(path.c_str(), &status) == 0) return status.st_mode & S_IFMT;
+    if (errno == ENOENT || errno == ENOTDIR) return NOTHING;
+    return std::nullopt;
+}
+
+void refuse(const std::string &path, const std::string &why)
+{
+    DebugLog("ERROR: local_path refused: [%s] %s\n", path.c_str(), why.c_str());
+}
+
+} // namespace
 
 bool keeps_snapshots(const RsyncJob &job)
 {
@@ -32,20 +54,24 @@ std::vector<std::string> snapshots_in_use(const RsyncJob &job)
 
 std::string why_no_folder(const std::string &path)
 {
-    struct stat status = {};
-    if (lstat(path.c_str(), &status) != 0) {
-        const bool missing = errno == ENOENT || errno == ENOTDIR;
-        return missing ? "" : std::string("cannot be looked at: ") + std::strerror(errno);
-    }
-    if (S_ISDIR(status.st_mode)) return "";
-    return S_ISLNK(status.st_mode) ? "is a link" : "is no folder";
+    const auto type = type_at(path);
+    if (!type) return std::string("cannot be looked at: ") + std::strerror(errno);
+    if (*type == NOTHING || *type == S_IFDIR) return "";
+    return *type == S_IFLNK ? "is a link" : "is no folder";
+}
+
+std::optional<bool> is_folder(const std::string &path)
+{
+    if (const auto type = type_at(path)) return *type == S_IFDIR;
+    refuse(path, why_no_folder(path));
+    return std::nullopt;
 }
 
 bool are_folders(const std::vector<std::string> &paths)
 {
     return std::all_of(paths.begin(), paths.end(), [](const std::string &path) {
         const std::string fault = why_no_folder(path);
-        if (!fault.empty()) DebugLog("ERROR: local_path refused: [%s] %s\n", path.c_str(), fault.c_str());
+        if (!fault.empty()) refuse(path, fault);
         return fault.empty();
     });
 }

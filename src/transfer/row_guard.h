@@ -5,6 +5,7 @@
 
 #include "config/job.h"
 
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -20,6 +21,10 @@ std::vector<std::string> snapshots_in_use(const RsyncJob &job);
 
 // What is wrong with a path at which a folder must stand, or nothing; empty when that is so.
 std::string why_no_folder(const std::string &path);
+
+// Whether a folder stands there. Nothing, with a trace, when that cannot be told: one that passes for a file
+// would be copied to another place.
+std::optional<bool> is_folder(const std::string &path);
 
 // False, with a trace that names it, when one of the paths is not so.
 bool are_folders(const std::vector<std::string> &paths);

@@ -4,13 +4,13 @@
 #include "common/debug_log.h"
 #include "common/excludes.h"
 #include "common/job_files.h"
-#include "common/private_file.h"
 #include "common/run_options.h"
 #include "common/shell.h"
 #include "common/shell_text.h"
 #include "common/text.h"
 #include "config/current_job.h"
 #include "remote/ssh_login.h"
+#include "transfer/row_guard.h"
 
 namespace bakjob
 {
@@ -94,7 +94,9 @@ std::optional<std::string> rsync_build_command(const RsyncJob &job)
     if (!option_text || !remote_path) return std::nullopt;
 
     // Only a directory, not a link to one, is copied by its contents.
-    const std::string slash = is_directory(job.local_path) ? "/" : "";
+    const auto names_folder = is_folder(job.local_path);
+    if (!names_folder) return std::nullopt;
+    const std::string slash = *names_folder ? "/" : "";
     const bool recover = run_options.recover_seq != 0;
     const bool pull = !recover && job.backup_type != BACKUP_PUSH;
     std::string local = job.local_path + slash;
