@@ -35,7 +35,8 @@ bool mark(const std::string &snapshot, bool write_out)
         fsetxattr(folder.get(), SNAPSHOT_MARK, name.data(), name.size(), 0) == 0) {
         return true;
     }
-    if (errno != ENOTSUP) {
+    // Where no mark can be, or nothing is to be marked, there is nothing to say.
+    if (errno != ENOTSUP && errno != EPERM && errno != ENOENT) {
         DebugLog("ERROR: snapshot [%s] not marked as complete: %s\n", snapshot.c_str(), std::strerror(errno));
     }
     return false;

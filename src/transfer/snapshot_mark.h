@@ -16,8 +16,8 @@ bool is_marked_whole(const std::string &snapshot);
 // Whether the file system of a folder can keep marks.
 bool keeps_marks(const std::string &folder);
 
-// Marks the folder, not one behind a link. False when it cannot be, with a trace unless the file system keeps
-// no marks.
+// Marks the folder, not one behind a link. False when it cannot be; with a trace, unless there is no folder,
+// the file system keeps no marks, or this process may set none.
 bool mark_whole(const std::string &snapshot);
 
 // The same, once what was written to the file system is on its disk: a power cut must not leave a marked
