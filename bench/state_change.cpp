@@ -59,7 +59,7 @@ void keep_memory()
 
 void put_in_place(const std::string &text)
 {
-    if (!device::replace_file(CONFIG_FILE, text, 0600)) fail("cannot write the store");
+    if (!device::replace_file(CONFIG_FILE, text, {.mode = 0600}).on_disk) fail("cannot write the store");
 }
 
 std::string contents(const char *path)
@@ -118,8 +118,8 @@ bool parse_and_replace_two()
     if (!document.load_file(CONFIG_FILE)) return false;
     std::ostringstream text;
     document.save(text, " ");
-    return device::replace_file(COPY, text.view(), 0600) &&
-           device::replace_file(SECOND_COPY, text.view(), 0600);
+    return device::replace_file(COPY, text.view(), {.mode = 0600}).on_disk &&
+           device::replace_file(SECOND_COPY, text.view(), {.mode = 0600}).on_disk;
 }
 
 void compare_with(const std::function<bool()> &other, int pairs, const char *file)

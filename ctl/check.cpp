@@ -62,6 +62,7 @@ int check_job(const Request &request)
     const StoredJob job = read_job(request.name);
     Findings findings;
     check_here(job.record, job.schedule, findings);
+    check_local_copies(job.record, findings);
     if (request.probe) check_remote_side(job.record, findings);
     for (Finding &finding : findings) {
         finding.todo = with_name(finding.todo, request.name);

@@ -234,7 +234,11 @@ void Check::programs()
 void Check::serial()
 {
     char serial[SERIAL_SIZE] = "";
-    if (rsync_read_serial(serial) < 0 || *serial == '\0') {
+    const std::string refusal = rsync_serial_refusal();
+    if (!refusal.empty()) {
+        problem(SERIAL_FILE, refusal + ", so the folder on the remote side is named without it",
+                "Find out who wrote it, and let the appliance write it anew.");
+    } else if (rsync_read_serial(serial) < 0 || *serial == '\0') {
         note(SERIAL_FILE, "it holds no serial text: the folder on the remote side has none in its name",
              "On the appliance it is written at its start.");
     } else if (std::strpbrk(serial, "\r\n") != nullptr) {

@@ -53,7 +53,7 @@ int set_enable(const Request &request, int enable)
 bool hand_over()
 {
     const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
-    return rsync_apply_schedule() == 1;
+    return lock && rsync_apply_schedule() == 1;
 }
 
 // A change of a job that changes its timetable, too: saved at once, and then handed over to the scheduler.

@@ -253,7 +253,7 @@ void apply_settings(RsyncJob &job, const std::vector<Setting> &settings)
         } else {
             copy_text(text_field(job, field), field.size, value);
         }
-        job.cut_fields &= ~(1U << static_cast<unsigned>(&field - job_fields().data()));
+        forget_whole_text(job, field.key);
     }
 }
 

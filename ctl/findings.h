@@ -29,6 +29,9 @@ using Findings = std::vector<Finding>;
 // Looks at the job and at this device; asks nobody.
 void check_here(const RsyncJob &job, const std::vector<ScheduleEntry> &schedule, Findings &findings);
 
+// Looks at what a job that fetches has and may bring into its folders: snapshots, links, setuid programs.
+void check_local_copies(const RsyncJob &job, Findings &findings);
+
 // Asks the remote side what a run would ask, folder by folder, and changes nothing there.
 void check_remote_side(const RsyncJob &job, Findings &findings);
 

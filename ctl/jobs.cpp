@@ -11,6 +11,9 @@
 #include "failure.h"
 #include "platform/device.h"
 
+#include <cerrno>
+#include <cstring>
+
 namespace bakjob::ctl
 {
 
@@ -24,10 +27,15 @@ namespace
 
 } // namespace
 
+void load_jobs()
+{
+    if (!rsync_load_jobs()) throw Failure(std::string("not all jobs can be read: ") + rsync_load_failure());
+}
+
 std::vector<StoredJob> read_jobs()
 {
     const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
-    rsync_load_jobs();
+    load_jobs();
     std::vector<StoredJob> jobs;
     for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
         rsync_copy_job(jobs.emplace_back().record, *job);
@@ -47,15 +55,22 @@ StoredJob read_job(const std::string &name)
 
 void change_jobs(const std::function<void()> &change)
 {
-    const JobChange changed = rsync_change_jobs([&] {
+    const auto changing = [&] {
         change();
         return true;
-    });
-    if (changed != JobChange::SAVED) {
-        throw Failure("the configuration could not be written; it is as it was");
+    };
+    const JobChange changed = rsync_change_jobs(changing, WithoutLock::REFUSE);
+    if (changed == JobChange::NOT_LOCKED) {
+        throw Failure(std::string(CONFIG_LOCK_FILE) + " cannot be locked: " + std::strerror(errno) +
+                      "; nothing is changed");
     }
+    if (changed == JobChange::NOT_LOADED) {
+        throw Failure(std::string("nothing is changed, as not all jobs can be read: ") +
+                      rsync_load_failure());
+    }
+    if (changed != JobChange::SAVED) throw Failure("the configuration could not be written");
     const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
-    if (LIB_CP_Config_To_MTD(1) < 0) {
+    if (!lock || LIB_CP_Config_To_MTD(1) < 0) {
         throw Failure("the configuration is changed, but could not be copied to flash");
     }
 }

@@ -17,13 +17,17 @@ struct StoredJob {
     std::vector<ScheduleEntry> schedule;
 };
 
+// Loads the list; Failure when a job may be left out.
+void load_jobs();
+
 std::vector<StoredJob> read_jobs();
 
 // Failure when there is no job of that name.
 StoredJob read_job(const std::string &name);
 
 // Runs `change` on the loaded job list under the configuration lock, saves, and copies the configuration to
-// flash. Nothing is saved when `change` throws; Failure when the save or the copy fails.
+// flash. Nothing is saved when `change` throws; Failure when the lock cannot be had, or the save or the copy
+// fails.
 void change_jobs(const std::function<void()> &change);
 
 // The same for one job.

@@ -1,6 +1,8 @@
 // bakjobctl: backup jobs for people. The words of the command line, and which function they mean.
 
 #include "commands.h"
+#include "common/process_start.h"
+#include "config/config_lock.h"
 #include "failure.h"
 
 #include <CLI/CLI.hpp>
@@ -8,6 +10,7 @@
 #include <csignal>
 #include <cstdio>
 #include <exception>
+#include <string>
 #include <string_view>
 #include <unistd.h>
 
@@ -98,10 +101,20 @@ int run(int argc, char **argv)
     return act(app, request);
 }
 
+void tell_of_wait(const char *path, const std::optional<bakjob::LockHolder> &holder)
+{
+    std::string who = "another process";
+    if (holder) who = "process " + std::to_string(holder->process);
+    if (holder && !holder->program.empty()) who += " (" + holder->program + ')';
+    std::fprintf(stderr, "bakjobctl: waiting for %s, which %s holds\n", path, who.c_str());
+}
+
 } // namespace
 
 int main(int argc, char **argv)
 {
+    bakjob::rsync_prepare_process();
+    bakjob::rsync_tell_lock_waits(tell_of_wait);
     std::signal(SIGXFSZ, SIG_IGN); // a file that may not grow is a failed write
     try {
         const int status = run(argc, argv);

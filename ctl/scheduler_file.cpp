@@ -6,6 +6,7 @@
 #include "config/job_list.h"
 #include "config/job_store.h"
 #include "config/schedule.h"
+#include "jobs.h"
 #include "summary.h"
 
 #include <algorithm>
@@ -58,7 +59,7 @@ std::optional<ScheduleDifference> schedule_difference(const std::string &job_nam
 {
     if (!is_directory(CRON_FOLDER)) return std::nullopt;
     const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
-    rsync_load_jobs();
+    load_jobs();
     ScheduleDifference difference;
     std::set<std::string> taken_over = cron_lines();
     for (const ScheduleEntry &entry : rsync_job_schedule(job_name)) {

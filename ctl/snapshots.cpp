@@ -6,6 +6,7 @@
 #include "failure.h"
 #include "jobs.h"
 #include "output.h"
+#include "transfer/snapshot_mark.h"
 
 #include <cstdio>
 #include <cstring>
@@ -51,18 +52,24 @@ int show_snapshots(const Request &request)
         const RecoverEntry &entry = recover_list.entries[i];
         const auto number = recover_number(entry);
         if (!number) continue;
+        // What a part of the files lacks, a recover run deletes at the remote side.
+        const bool complete = is_marked_whole(entry.path);
         const std::string command =
-            "bakjob -n " + std::to_string(*number) + " -r " + name_for_shell(request.name);
-        rows.push_back({std::to_string(*number), entry.time, entry.path, command});
-        list.push_back(
-            {{"number", *number}, {"time", entry.time}, {"path", entry.path}, {"recover", command}});
+            complete ? "bakjob -n " + std::to_string(*number) + " -r " + name_for_shell(request.name) : "";
+        rows.push_back(
+            {std::to_string(*number), entry.time, complete ? "yes" : "not known", entry.path, command});
+        list.push_back({{"number", *number},
+                        {"time", entry.time},
+                        {"path", entry.path},
+                        {"complete", complete},
+                        {"recover", complete ? Json(command) : Json()}});
     }
     if (request.json) {
         print_json(list);
     } else if (rows.empty()) {
         std::puts("There are none yet.");
     } else {
-        print_table({"NUMBER", "TIME", "PATH", "RECOVERED TO THE REMOTE SIDE BY"}, rows);
+        print_table({"NUMBER", "TIME", "COMPLETE", "PATH", "RECOVERED TO THE REMOTE SIDE BY"}, rows);
     }
     return EXIT_FINE;
 }

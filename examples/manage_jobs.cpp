@@ -67,7 +67,8 @@ int main(int argc, char **argv)
         return 2;
     }
     if (rsync_add_job(job) == 0) {
-        std::fputs("manage_jobs: there is a job of that name\n", stderr);
+        const char *const failure = rsync_load_failure();
+        std::fprintf(stderr, "manage_jobs: %s\n", failure ? failure : "there is a job of that name");
         return 1;
     }
     list_jobs();

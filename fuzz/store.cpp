@@ -9,6 +9,7 @@
 #include "platform/config_store.h"
 #include "store_paths.h"
 
+#include <algorithm>
 #include <cstring>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -93,7 +94,11 @@ void check(std::string_view file)
     must(again.size() == jobs.size(), "no job is lost or made up");
     for (std::size_t i = 0; i < jobs.size(); ++i) {
         must(is_same(jobs[i], again[i]), "a job comes back as it was");
-        must(jobs[i].cut_fields == again[i].cut_fields, "a text that was cut does not pass for a whole one");
+        const bool all_cut =
+            std::all_of(job_fields().begin(), job_fields().end(), [&](const JobField &field) {
+                return was_cut(jobs[i], field.key) == was_cut(again[i], field.key);
+            });
+        must(all_cut, "a text that was cut does not pass for a whole one");
     }
     check_schedule();
 }

@@ -160,17 +160,35 @@ TEST_F(ConfigStore, WritesOfOtherProcessesAreSeenBetweenWalks)
     EXPECT_EQ(xml_get_int("/list/count"), 1);
     EXPECT_EQ(text_at("/list/item:1/name"), "new");
 
-    // A change of one's own begins with what is there now, and then stays until it is saved.
+    // What was read from one file is not changed in another: its items may have other numbers now.
     ASSERT_EQ(in_child([] {
                   xml_set_str("/other", "theirs");
                   return xml_write_file(STORE);
               }),
               0);
+    const std::string theirs = read_file(STORE);
+    testing::internal::CaptureStderr();
+    EXPECT_LT(xml_set_str("/list/item:1/name", "mine"), 0);
+    EXPECT_LT(xml_del("/list"), 0);
+    EXPECT_LT(xml_write_file(STORE), 0);
+    EXPECT_NE(testing::internal::GetCapturedStderr().find("a change could not be made"), std::string::npos);
+    EXPECT_EQ(read_file(STORE), theirs);
+
+    // A change of one's own begins with what is there now, and then stays until it is saved.
+    EXPECT_EQ(xml_get_int("/list/count"), 1);
     ASSERT_EQ(xml_set_str("/list/item:1/name", "mine"), 0);
     EXPECT_EQ(xml_get_int("/list/count"), 1);
     EXPECT_EQ(text_at("/list/item:1/name"), "mine");
     ASSERT_EQ(xml_write_file(STORE), 0);
     EXPECT_EQ(text_at("/other"), "theirs");
+
+    // Nor is a file written over that came after the reading.
+    ASSERT_EQ(xml_set_str("/list/item:1/name", "again"), 0);
+    write_file(STORE, "<config><other>newer</other></config>");
+    testing::internal::CaptureStderr();
+    EXPECT_LT(xml_write_file(STORE), 0);
+    EXPECT_NE(testing::internal::GetCapturedStderr().find("somebody else"), std::string::npos);
+    EXPECT_EQ(text_at("/other"), "newer");
 
     fs::remove(STORE);
     EXPECT_EQ(text_at("/other"), "(none)");
@@ -188,7 +206,8 @@ TEST_F(ConfigStore, ADamagedFileIsLeftAsItIs)
         EXPECT_LT(xml_write_file(STORE), 0);
         EXPECT_LT(LIB_do_ctc(), 0);
         const std::string said = testing::internal::GetCapturedStderr();
-        EXPECT_EQ(std::count(said.begin(), said.end(), '\n'), 1) << said;
+        EXPECT_EQ(std::count(said.begin(), said.end(), '\n'), 2)
+            << said; // the reason, and that nothing is written
         EXPECT_EQ(read_file(STORE), damage);
     }
     write_file(STORE, "<config><a>3</a></config>");

@@ -2,7 +2,6 @@
 #include "cli/process_guard.h"
 #include "cli/recover_list.h"
 #include "common/run_options.h"
-#include "config/config_lock.h"
 #include "config/job_list.h"
 #include "support.h"
 
@@ -153,42 +152,6 @@ TEST_F(State, OnlyStaleStatesAreReset)
     EXPECT_EQ(bakjob_program("-a").status, 0);
     EXPECT_EQ(fs::last_write_time("/etc/NAS_CFG/config.xml"), written) << "nothing stale, nothing written";
     EXPECT_FALSE(exists("/var/lib/device_flash/config.xml"));
-}
-
-TEST_F(State, TheLockIsExclusiveAndNobodyElsesFile)
-{
-    const char *const path = "/tmp/lock";
-    {
-        const UniqueFd lock = rsync_lock_config(path);
-        ASSERT_TRUE(lock);
-        const UniqueFd other(open(path, O_RDONLY));
-        EXPECT_NE(flock(other.get(), LOCK_EX | LOCK_NB), 0);
-    }
-    fs::remove(path);
-    write_file("/tmp/victim", "kept");
-    fs::create_symlink("/tmp/victim", path);
-    EXPECT_TRUE(rsync_lock_config(path));
-    EXPECT_EQ(read_file("/tmp/victim"), "kept");
-    EXPECT_TRUE(fs::is_regular_file(fs::symlink_status(path)));
-    fs::remove(path);
-    ASSERT_EQ(mkfifo(path, 0666), 0);
-    EXPECT_TRUE(rsync_lock_config(path)) << "must not wait on a pipe";
-    fs::remove(path);
-    // Another user's lock is a lock too.
-    shell("install -o 1 -m 644 /dev/null /tmp/lock");
-    const pid_t holder = fork();
-    if (holder == 0) {
-        const UniqueFd held = rsync_lock_config(path);
-        write_file("/tmp/held", "");
-        usleep(300'000);
-        write_file("/tmp/released", "");
-        _exit(0);
-    }
-    ASSERT_TRUE(eventually([] { return exists("/tmp/held"); }));
-    EXPECT_TRUE(rsync_lock_config(path));
-    EXPECT_TRUE(exists("/tmp/released"));
-    waitpid(holder, nullptr, 0);
-    EXPECT_FALSE(rsync_lock_config("/no/such/folder/lock"));
 }
 
 TEST_F(RecoverListing, NumbersTheSnapshotsInNameOrder)

@@ -1,13 +1,17 @@
+#include "common/run_options.h"
 #include "common/shell.h"
 #include "common/text.h"
 #include "config/current_job.h"
 #include "remote/daemon_config.h"
 #include "remote/daemon_test.h"
+#include "remote/discovery.h"
 #include "remote/remote_dir.h"
 #include "remote/ssh_login.h"
 #include "remote/ssh_test.h"
 #include "support.h"
 
+#include <csignal>
+#include <fcntl.h>
 #include <unistd.h>
 
 using namespace bakjob;
@@ -239,4 +243,37 @@ TEST_F(Remote, AMissingFolderIsMadeBelowTheModulesOwn)
         EXPECT_FALSE(exists("/tmp/remote_rshareinfo_it's.txt"));
     }
     EXPECT_FALSE(exists("/tmp/pwned"));
+}
+
+TEST_F(Remote, AConfigurationWithoutEndFillsNoDisk)
+{
+    const Fake ssh("/usr/sbin/ssh", "exec 3>&1\n(yes | head -c 9000000) >&3\n"
+                                    "stat --format=%s /tmp/remote_r*.txt >>/tmp/size\n");
+    std::signal(SIGXFSZ, SIG_IGN);
+    run_options.debug_mode = 1;
+    testing::internal::CaptureStdout();
+    EXPECT_FALSE(rsync_find_module_folder(named("daily"), "backup"));
+    CurrentJob.server_type = SERVER_SAME_KIND;
+    rsync_discover_remote();
+    const std::string trace = testing::internal::GetCapturedStdout();
+    EXPECT_NE(trace.find("ERROR: [/tmp/remote_rshareinfo_daily.txt] refused"), std::string::npos) << trace;
+    const auto sizes = lines_of(read_file("/tmp/size"));
+    ASSERT_EQ(sizes.size(), 2U);
+    for (const std::string &size : sizes)
+        EXPECT_LT(std::stoi(size), 1'050'000) << "with what the captured output has already";
+    EXPECT_EQ(shell("ls /tmp | grep 'remote.*txt'").output, "") << "neither copy stays";
+    EXPECT_NE(std::signal(SIGXFSZ, SIG_DFL), SIG_DFL) << "as it was before";
+    EXPECT_EQ(shell("ulimit -f").output, "unlimited\n");
+}
+
+TEST_F(Remote, ALongLogTakesTheMessagesOfTheFetch)
+{
+    const Fake ssh("/usr/sbin/ssh", "echo warning >&2 || exit; printf '[ backup ]\npath = /m\n'\n");
+    write_file("/tmp/log", std::string(3'000'000, 'x'));
+    EXPECT_EQ(in_child([] {
+                  dup2(open("/tmp/log", O_WRONLY | O_APPEND), STDERR_FILENO);
+                  return rsync_find_module_folder(named("daily"), "backup") == "/m" ? 5 : 0;
+              }),
+              5);
+    EXPECT_TRUE(read_file("/tmp/log").ends_with("warning\n"));
 }

@@ -1,7 +1,7 @@
 #pragma once
 
-// What the tests of what must always hold share: programs started without a shell, their fixture with its row
-// in the table of scripts/soak, and a server that misbehaves.
+// For tests of what must hold however often it is tried: a few rounds in the tests; with BAKJOB_SOAK in the
+// environment many, and a line per subject in the file that it names (see scripts/soak).
 
 #include "support.h"
 
@@ -12,7 +12,7 @@
 
 inline constexpr const char *SHARE = "/mnt/HD/HD_a2/Public";
 
-// The file for the rows of the table; null when there is no soak.
+// The file of the table; null in the tests.
 const char *soak_table();
 
 int rounds(int here, int soaking);
@@ -20,7 +20,7 @@ int rounds(int here, int soaking);
 // Starts the program; its output goes to /tmp/output.
 pid_t start(const std::vector<std::string> &arguments);
 
-// Waits. The exit status, 128 and the signal's number when one ended it.
+// The exit code of a child, or 128 and the signal that ended it.
 int wait_for(pid_t child);
 
 // Runs the program with arguments that no shell sees. Its trace.

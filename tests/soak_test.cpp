@@ -1,6 +1,5 @@
 // What must hold however often it is tried: hostile values, kills in mid-save, races for one job, kills of
-// runs, files placed beforehand, remote sides that misbehave. A few rounds each here; with BAKJOB_SOAK in the
-// environment many, and a line per subject in the file that it names (see scripts/soak).
+// runs, files placed beforehand, remote sides that misbehave.
 
 #include "cli/job_state.h"
 #include "common/debug_log.h"
@@ -18,7 +17,6 @@
 #include <cstring>
 #include <fcntl.h>
 #include <filesystem>
-#include <fstream>
 #include <random>
 #include <sys/resource.h>
 #include <sys/stat.h>

@@ -1,4 +1,5 @@
 #include "cli/source_folders.h"
+#include "common/run_options.h"
 #include "support.h"
 
 #include <cstring>
@@ -66,7 +67,7 @@ TEST_F(Folders, AListIsSplitAndWhatDoesNotFitIsCounted)
 {
     const auto split = [](const std::string &list, bool cut = false) {
         RsyncJob job{};
-        if (cut) job.cut_fields = ~0U;
+        if (cut) job.whole_texts = std::make_shared<WholeTexts>(WholeTexts{{"local_path", list + "more"}});
         snprintf(job.local_path, sizeof job.local_path, "%s", list.c_str());
         FolderTable table{};
         rsync_split_folders(job, table);
@@ -110,7 +111,19 @@ TEST_F(Folders, ProgressAndSerialAreReadAndWrittenSafely)
         EXPECT_EQ(rsync_read_serial(serial), 0);
         EXPECT_EQ(serial, read);
     }
-    fs::remove("/tmp/kv_serial.txt");
-    ASSERT_EQ(mkfifo("/tmp/kv_serial.txt", 0666), 0);
-    EXPECT_EQ(rsync_read_serial(serial), 0) << "must not wait on a pipe";
+    for (const char *made : {"mkfifo $f", "mkdir $f", "echo S2 >/tmp/other; ln -s /tmp/other $f",
+                             "printf S2 >$f; ln $f /tmp/more", "printf S2 >$f; chown 1000 $f",
+                             "printf S2 >$f; chmod 664 $f", "printf S2 >$f; chmod 646 $f",
+                             "printf ../../etc >$f", "printf '/\\n' >$f", "printf . >$f", "printf .. >$f"}) {
+        shell(std::string("f=/tmp/kv_serial.txt; rm -rf $f /tmp/other /tmp/more; ") + made);
+        copy_text(serial, "as it was");
+        EXPECT_EQ(rsync_read_serial(serial), -1) << made;
+        EXPECT_STREQ(serial, "as it was") << made;
+        EXPECT_NE(rsync_serial_refusal(), "") << made;
+        run_options.debug_mode = 1;
+        testing::internal::CaptureStdout();
+        EXPECT_EQ(rsync_remote_root(named("j")), "/_remote_backup/j") << made;
+        EXPECT_TRUE(testing::internal::GetCapturedStdout().starts_with("ERROR: serial text of [")) << made;
+        run_options.debug_mode = 0;
+    }
 }

@@ -93,15 +93,23 @@ void Appliance::TearDown()
     fs::current_path("/");
 }
 
+// The store looks at its file before it reads a plain path, and takes changes only of lists that were read
+// since.
+static void look_at_store(const std::string &path)
+{
+    const std::string plain = path.substr(0, path.find(':'));
+    xml_get_int((plain.substr(0, plain.rfind('/')) + "/count").c_str());
+}
+
 void store_set(const std::string &path, const std::string &text)
 {
+    look_at_store(path);
     ASSERT_EQ(xml_set_str(path.c_str(), text.c_str()), 0) << path;
 }
 
 std::string store_get(const std::string &path)
 {
-    // A plain path has the store look at its file first.
-    xml_get_int("/backup_mgr/rsync/count");
+    look_at_store(path);
     std::array<char, 4096> text{};
     return xml_get_str(path.c_str(), text.size(), text.data()) < 0 ? "(none)" : text.data();
 }

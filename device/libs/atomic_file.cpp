@@ -10,6 +10,7 @@
 #include <memory>
 #include <sys/stat.h>
 #include <unistd.h>
+#include <utility>
 
 using bakjob::UniqueFd;
 
@@ -59,17 +60,16 @@ void remove_leftovers(const std::string &folder, const std::string &start)
     }
 }
 
-// The rename is on disk only when the folder is. A failure here cannot be undone, nor does it make the new
-// file a wrong one, so it is nobody's failure.
-void sync_folder(const std::string &folder)
+// The rename is on disk only when the folder is.
+bool sync_folder(const std::string &folder)
 {
     const UniqueFd fd(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    if (fd) fsync(fd.get());
+    return fd && (fsync(fd.get()) == 0 || errno == EINVAL); // EINVAL: its file system has no such thing
 }
 
 } // namespace
 
-UniqueFd replace_file(const std::string &path, std::string_view contents, mode_t mode)
+Replaced replace_file(const std::string &path, std::string_view contents, const FileOwner &owner)
 {
     const std::string folder = folder_of(path);
     const std::string start = name_of(path) + std::string(TEMPORARY_MARK);
@@ -78,7 +78,8 @@ UniqueFd replace_file(const std::string &path, std::string_view contents, mode_t
     const std::string temporary = path + std::string(TEMPORARY_MARK) + std::to_string(getpid());
     UniqueFd fd(open(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600));
     if (!fd) return {};
-    const bool replaced = fchmod(fd.get(), mode) == 0 && bakjob::write_all(fd.get(), contents) &&
+    const bool replaced = fchown(fd.get(), owner.user, owner.group) == 0 &&
+                          fchmod(fd.get(), owner.mode) == 0 && bakjob::write_all(fd.get(), contents) &&
                           fsync(fd.get()) == 0 && std::rename(temporary.c_str(), path.c_str()) == 0;
     if (!replaced) {
         const int reason = errno;
@@ -86,8 +87,8 @@ UniqueFd replace_file(const std::string &path, std::string_view contents, mode_t
         errno = reason;
         return {};
     }
-    sync_folder(folder);
-    return fd;
+    const bool on_disk = sync_folder(folder);
+    return {std::move(fd), on_disk};
 }
 
 bool read_whole(int fd, std::string &contents)

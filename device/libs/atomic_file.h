@@ -11,10 +11,20 @@
 namespace device
 {
 
-// Puts a file with these contents and this mode in the place of `path`, with the new one written to disk
-// before the old one goes. The result is the new file, open; none on failure, with errno telling why and the
-// old file as it was. Temporaries that processes which died left beside `path` are removed.
-bakjob::UniqueFd replace_file(const std::string &path, std::string_view contents, mode_t mode);
+struct FileOwner {
+    mode_t mode;
+    uid_t user = 0;
+    gid_t group = 0;
+};
+
+struct Replaced {
+    bakjob::UniqueFd file; // the new one, open; none: it failed (errno) and the old file is as it was
+    bool on_disk = false;  // false with a file: its folder could not be synced (errno)
+};
+
+// Puts a file with these contents in the place of `path`, with the new one written to disk before the old one
+// goes. Temporaries that processes which died left beside `path` are removed.
+Replaced replace_file(const std::string &path, std::string_view contents, const FileOwner &owner);
 
 // Reads an open file from where it stands to its end. False on failure, with errno telling why.
 bool read_whole(int fd, std::string &contents);

@@ -4,15 +4,21 @@
 // looked at before a change, and before a read of a path without a numbered step, and read again when it is
 // another one. Reads through a numbered step, "item:3/name", take the tree as it is: whoever walks a list has
 // read its count before, and must see the whole walk in one tree.
+//
+// Nor may what was read from one tree be changed in another. So a list that was read before the file changed
+// takes no change until it has been read anew, and the file is written only in the place of the one that was
+// read.
 
 #include "platform/config_store.h"
 
 #include "atomic_file.h"
-#include "common/handles.h"
 #include "list_cursors.h"
+#include "read_lists.h"
 #include "store.h"
+#include "store_file.h"
 #include "store_path.h"
 #include "store_paths.h"
+#include "xml_tree.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -20,11 +26,9 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <fcntl.h>
+#include <new>
 #include <pugixml.hpp>
-#include <sys/stat.h>
 
-using bakjob::UniqueFd;
 using pugi::xml_node;
 
 namespace device
@@ -34,45 +38,18 @@ namespace
 
 constexpr const char *ROOT_NAME = "config";
 
-// Values keep every byte: no trimming, no conversion of line ends. What a person adds by hand stays as well.
-constexpr unsigned PARSE_FLAGS = pugi::parse_cdata | pugi::parse_escapes | pugi::parse_ws_pcdata_single |
-                                 pugi::parse_comments | pugi::parse_declaration | pugi::parse_doctype |
-                                 pugi::parse_pi;
-
-struct FileVersion {
-    int error = 0; // of looking at it; ENOENT when there is no file
-    dev_t device = 0;
-    ino_t inode = 0;
-    off_t size = 0;
-    time_t seconds = 0;
-    long nanoseconds = 0;
-
-    bool operator==(const FileVersion &) const = default;
-};
-
-FileVersion version_of(const struct stat &status)
-{
-    return {0, status.st_dev, status.st_ino, status.st_size, status.st_mtim.tv_sec, status.st_mtim.tv_nsec};
-}
-
-FileVersion current_version()
-{
-    struct stat status = {};
-    if (stat(STORE_FILE, &status) < 0) return {.error = errno};
-    return version_of(status);
-}
-
 struct Store {
     enum class State { NOT_READ, GOOD, DAMAGED };
 
     State state = State::NOT_READ;
     bool unsaved = false;
-    FileVersion version;
-    UniqueFd file; // stays open, so that no later file can have the same inode
+    bool broken = false; // a change failed: the tree is neither the old one nor the new one
+    StoreFile file;      // that the tree is from
     FileVersion complained_about;
     pugi::xml_document document;
     ListCursors cursors;
     RecordCursor record;
+    ReadLists lists;
 
     void forget_nodes()
     {
@@ -94,32 +71,18 @@ void complain(const FileVersion &version, const char *why)
     std::fprintf(stderr, "config store: %s: %s\n", STORE_FILE, why);
 }
 
-const char *parse(const std::string &text)
-{
-    pugi::xml_document &document = store().document;
-    const auto result = document.load_buffer(text.data(), text.size(), PARSE_FLAGS, pugi::encoding_utf8);
-    if (!result) return result.description();
-    if (std::strcmp(document.document_element().name(), ROOT_NAME) != 0) return "the root is not <config>";
-    return nullptr;
-}
-
-// Opens and parses the file. The result is why that failed, or null.
+// Null, or why the tree is not to be used.
 const char *load()
 {
     Store &s = store();
-    // A fifo in its place must not make us wait.
-    s.file = UniqueFd(open(STORE_FILE, O_RDONLY | O_CLOEXEC | O_NONBLOCK));
-    if (!s.file) {
-        s.version = {.error = errno};
-        return errno == ENOENT ? nullptr : std::strerror(errno);
+    try {
+        std::string text;
+        if (const char *const why = read_store_file(s.file, text)) return why;
+        return s.file.file ? parse_tree(s.document, text) : nullptr;
+    } catch (const std::bad_alloc &) {
+        s.file.version = {.error = -1};
+        return std::strerror(ENOMEM);
     }
-    struct stat status = {};
-    if (fstat(s.file.get(), &status) < 0) return std::strerror(errno);
-    s.version = version_of(status);
-    if (!S_ISREG(status.st_mode)) return "not a regular file";
-    std::string text;
-    if (!read_whole(s.file.get(), text)) return std::strerror(errno);
-    return parse(text);
 }
 
 void read_file()
@@ -127,11 +90,12 @@ void read_file()
     Store &s = store();
     s.forget_nodes();
     s.document.reset();
-    s.unsaved = false;
+    s.unsaved = s.broken = false;
+    s.lists.tree_changed();
     const char *const why = load();
     s.state = why ? Store::State::DAMAGED : Store::State::GOOD;
     if (why) {
-        complain(s.version, why);
+        complain(s.file.version, why);
         s.document.reset();
     }
 }
@@ -139,14 +103,21 @@ void read_file()
 void look_at_file()
 {
     const Store &s = store();
-    if (s.unsaved) return;
-    if (s.state == Store::State::NOT_READ || s.version != current_version()) read_file();
+    if (s.unsaved && !s.broken) return;
+    if (s.broken || s.state == Store::State::NOT_READ || s.file.version != current_version()) read_file();
 }
 
 void drop_tree()
 {
     store().state = Store::State::NOT_READ;
-    store().unsaved = false;
+    store().unsaved = store().broken = false;
+}
+
+bool takes_change(const char *path)
+{
+    look_at_file();
+    const Store &s = store();
+    return s.state == Store::State::GOOD && !s.broken && !s.lists.outdated(path);
 }
 
 xml_node plain_child(xml_node parent, std::string_view name)
@@ -163,7 +134,7 @@ xml_node resolve(const StorePath &path, bool create)
     Store &s = store();
     if (path.depth == 0 || s.state != Store::State::GOOD) return {};
     xml_node node = s.document.document_element();
-    if (!node && create) node = s.document.append_child(ROOT_NAME);
+    if (!node && create) node = append_element(s.document, ROOT_NAME);
     xml_node parent;
     for (const Step &step : path.used()) {
         parent = node;
@@ -171,7 +142,7 @@ xml_node resolve(const StorePath &path, bool create)
             node = s.cursors.numbered_child(parent, step.name, step.index, create);
         } else {
             node = plain_child(parent, step.name);
-            if (!node && create) node = parent.append_child(std::string(step.name).c_str());
+            if (!node && create) node = append_element(parent, std::string(step.name).c_str());
         }
         if (!node) break;
     }
@@ -194,37 +165,74 @@ xml_node find(const char *path_text)
     if (!path_text) return {};
     if (const char *const key = key_of_latest_record(path_text)) return store().record.key(key, false);
     const StorePath path = parse_store_path(path_text);
-    if (!path.numbered() || store().state != Store::State::GOOD) look_at_file();
+    if (!path.numbered()) {
+        look_at_file();
+        store().lists.read(path_text);
+    } else if (store().state == Store::State::NOT_READ) {
+        look_at_file();
+    }
     return resolve(path, false);
 }
 
 xml_node find_or_make(const char *path_text)
 {
-    look_at_file();
+    if (!takes_change(path_text)) return {};
     if (const char *const key = key_of_latest_record(path_text)) return store().record.key(key, true);
     return resolve(parse_store_path(path_text), true);
 }
 
-struct StringWriter : pugi::xml_writer {
-    std::string text;
-    void write(const void *data, size_t size) override { text.append(static_cast<const char *>(data), size); }
-};
-
-std::string as_file()
-{
-    StringWriter writer;
-    store().document.save(writer, " ", pugi::format_default, pugi::encoding_utf8);
-    return std::move(writer.text);
-}
-
-void adopt_version(UniqueFd file)
+// One that fails half way, or for want of memory, spoils the tree.
+template <class Change>
+int change(const Change &make)
 {
     Store &s = store();
-    struct stat status = {};
-    if (fstat(file.get(), &status) < 0) return drop_tree();
+    try {
+        const int answer = make();
+        s.unsaved |= answer == 0;
+        s.broken |= answer == XML_UNREADABLE;
+        return answer;
+    } catch (const std::bad_alloc &) {
+        s.broken = true;
+        return XML_UNREADABLE;
+    }
+}
+
+// When the store's own file cannot be written, the changes that were meant for it go: kept, they would
+// overwrite with a later success what others wrote in the meantime.
+const char *write_own_file()
+{
+    Store &s = store();
+    const char *why = nullptr;
+    if (s.broken) {
+        why = "a change could not be made";
+    } else if (s.state != Store::State::GOOD) {
+        why = "it could not be read";
+    } else {
+        why = replace_store_file(s.file, text_of(s.document));
+    }
+    if (why) drop_tree();
     s.unsaved = false;
-    s.version = version_of(status);
-    s.file = std::move(file);
+    return why;
+}
+
+const char *write_file(const char *file_name)
+{
+    if (!store().document.document_element() && !append_element(store().document, ROOT_NAME)) {
+        return std::strerror(ENOMEM);
+    }
+    if (std::strcmp(file_name, STORE_FILE) == 0) return write_own_file();
+    const Replaced replaced = replace_file(file_name, text_of(store().document), {.mode = 0600});
+    return replaced.on_disk ? nullptr : std::strerror(errno);
+}
+
+const char *write_or_say_why(const char *file_name)
+{
+    try {
+        return write_file(file_name);
+    } catch (const std::bad_alloc &) {
+        drop_tree();
+        return std::strerror(ENOMEM);
+    }
 }
 
 } // namespace
@@ -233,7 +241,7 @@ std::optional<std::string> store_text(const std::string &path)
 {
     const xml_node node = find(path.c_str());
     if (!node) return std::nullopt;
-    return node.text().get();
+    return std::string(value_of(node));
 }
 
 bool store_usable()
@@ -249,9 +257,10 @@ using namespace device;
 int xml_get_str(const char *path, int size, char *buffer)
 {
     const xml_node node = find(path);
+    if (store().state != Store::State::GOOD) return XML_UNREADABLE;
     if (!node || !buffer) return -1;
     if (size <= 0) return 0;
-    const std::string_view text = node.text().get();
+    const std::string_view text = value_of(node);
     const std::size_t length = std::min(text.size(), static_cast<std::size_t>(size) - 1);
     text.copy(buffer, length);
     buffer[length] = '\0';
@@ -260,7 +269,7 @@ int xml_get_str(const char *path, int size, char *buffer)
 
 int xml_get_int(const char *path)
 {
-    const char *const text = find(path).text().get();
+    const char *const text = value_of(find(path)).data(); // ends with a zero byte
     char *end = nullptr;
     const long value = std::strtol(text, &end, 10);
     if (end == text) return -1;
@@ -269,11 +278,11 @@ int xml_get_int(const char *path)
 
 int xml_set_str(const char *path, const char *text)
 {
-    if (!path || !text) return -1;
-    const xml_node node = find_or_make(path);
-    if (!node) return -1;
-    store().unsaved = true;
-    return node.text().set(text) ? 0 : -1;
+    if (!path || !text || parse_store_path(path).depth == 0) return -1;
+    return change([&] {
+        const xml_node node = find_or_make(path);
+        return node && set_value(node, text) ? 0 : XML_UNREADABLE;
+    });
 }
 
 int xml_set_int(const char *path, int value)
@@ -284,27 +293,21 @@ int xml_set_int(const char *path, int value)
 int xml_del(const char *path)
 {
     if (!path) return -1;
-    look_at_file();
-    const xml_node node = resolve(parse_store_path(path), false);
-    if (!node || !node.parent().remove_child(node)) return -1;
-    store().forget_nodes();
-    store().unsaved = true;
-    return 0;
+    return change([&] {
+        if (!takes_change(path)) return XML_UNREADABLE;
+        const xml_node node = resolve(parse_store_path(path), false);
+        if (!node || !node.parent().remove_child(node)) return -1;
+        store().forget_nodes();
+        return 0;
+    });
 }
 
-// When the store's own file cannot be written, the changes that were meant for it go: kept, they would
-// overwrite with a later success what others wrote in the meantime.
 int xml_write_file(const char *file_name)
 {
-    if (!file_name || !store_usable()) return -1;
-    if (!store().document.document_element()) store().document.append_child(ROOT_NAME);
-    const bool is_own_file = std::strcmp(file_name, STORE_FILE) == 0;
-    UniqueFd file = replace_file(file_name, as_file(), 0600);
-    if (!file) {
-        std::fprintf(stderr, "config store: cannot write %s: %s\n", file_name, std::strerror(errno));
-        if (is_own_file) drop_tree();
-        return -1;
-    }
-    if (is_own_file) adopt_version(std::move(file));
-    return 0;
+    if (!file_name) return -1;
+    if (!store().broken && !store().unsaved && !store_usable()) return -1;
+    const char *const why = write_or_say_why(file_name);
+    if (!why) return 0;
+    std::fprintf(stderr, "config store: cannot write %s: %s\n", file_name, why);
+    return -1;
 }

@@ -1,5 +1,7 @@
 #include "list_cursors.h"
 
+#include "xml_tree.h"
+
 #include <algorithm>
 
 using pugi::xml_node;
@@ -69,13 +71,13 @@ xml_node ListCursors::numbered_child(xml_node parent, std::string_view name, int
         node = first_named(parent, name);
         at = 1;
     }
-    if (!node && create) node = parent.append_child(cursor.name.c_str());
+    if (!node && create) node = append_element(parent, cursor.name.c_str());
     for (; node && at > index; --at) {
         node = previous_named(node, name);
     }
     for (; node && at < index; ++at) {
         const xml_node next = next_named(node, name);
-        node = next || !create ? next : parent.append_child(cursor.name.c_str());
+        node = next || !create ? next : append_element(parent, cursor.name.c_str());
     }
     if (node && node != cursor.node) {
         cursor.node = node;
@@ -95,7 +97,7 @@ xml_node RecordCursor::key(const char *name, bool create)
 {
     xml_node found = is_named(key_, name) ? key_ : element_from(key_.next_sibling(name));
     if (!found) found = element_from(record_.child(name));
-    if (!found && create) found = record_.append_child(name);
+    if (!found && create) found = append_element(record_, name);
     if (found) key_ = found;
     return found;
 }

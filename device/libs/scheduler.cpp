@@ -183,7 +183,7 @@ int LIB_do_ctc(void)
         if (!group) break;
         lines += cron_lines(*group);
     }
-    if (replace_file(CRON_FILE, lines, 0644)) return 0;
+    if (replace_file(CRON_FILE, lines, {.mode = 0644}).on_disk) return 0;
     std::fprintf(stderr, "scheduler: cannot write %s: %s\n", CRON_FILE, std::strerror(errno));
     return -1;
 }

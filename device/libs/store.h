@@ -11,6 +11,9 @@ namespace device
 // The whole text at `path`, however long; none when there is no such node.
 std::optional<std::string> store_text(const std::string &path);
 
+// Whether flash holds a configuration that could take the file's place.
+bool flash_has_good_copy();
+
 // False while the store's file is damaged: what reads as missing then may well be there.
 bool store_usable();
 

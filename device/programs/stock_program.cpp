@@ -111,6 +111,7 @@ int end_like(int status)
 int become_stock(const StockProgram &program, const std::vector<std::string> &arguments)
 {
     std::vector<char *> pointers;
+    pointers.reserve(arguments.size() + 1);
     for (const std::string &argument : arguments) {
         pointers.push_back(const_cast<char *>(argument.c_str()));
     }

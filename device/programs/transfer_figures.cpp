@@ -58,7 +58,7 @@ class FiguresFile
 public:
     explicit FiguresFile(const std::string &path)
     {
-        unlink(path.c_str());
+        std::remove(path.c_str());
         fd_ =
             bakjob::UniqueFd(open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0644));
     }

@@ -27,13 +27,14 @@ namespace
 
 bool saving = false; // and still true behind a save that threw
 
-// Whether the configuration has taken the states.
+// Whether the configuration has taken the states. One that could not be loaded whole may be damaged, and the
+// copy in flash may not be.
 bool save_and_commit()
 {
     saving = true;
     const bool saved = rsync_save_jobs();
-    LIB_CP_Config_To_MTD(1);
     saving = false;
+    if (rsync_load_failure() == nullptr) LIB_CP_Config_To_MTD(1);
     return saved;
 }
 
@@ -55,6 +56,12 @@ void forget_unrecorded(const std::string &job_name, StateKind kind)
 StateKind kind_of_run()
 {
     return run_options.restore_mode != 0 ? StateKind::RESTORE : StateKind::BACKUP;
+}
+
+void set_state(RsyncJob &job, StateKind kind, JobState state, const char *now)
+{
+    (kind == StateKind::RESTORE ? job.rstate : job.state) = state;
+    copy_text(kind == StateKind::RESTORE ? job.rlast_do_job_time : job.last_do_job_time, now);
 }
 
 bool reset_if_stale(std::int32_t &state, char (&time)[JOB_TIME_SIZE], const char *now)
@@ -83,18 +90,17 @@ int rsync_state_is_running(std::int32_t state)
 void rsync_set_job_state(const std::string &job_name, JobState state)
 {
     const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
-    rsync_load_jobs();
+    const bool loaded = rsync_load_jobs();
     RsyncJob *const job = rsync_find_job(job_name);
-    if (job == nullptr) {
+    if (job == nullptr && loaded) {
         rsync_free_jobs();
         return;
     }
-    const bool restore = run_options.restore_mode != 0;
-    (restore ? job->rstate : job->state) = state;
-    auto &time = restore ? job->rlast_do_job_time : job->last_do_job_time;
-    rsync_job_time(time);
-    const UnrecordedState as_set{state, time}; // the save frees the job
     const StateKind kind = kind_of_run();
+    char now[JOB_TIME_SIZE] = "";
+    rsync_job_time(now);
+    const UnrecordedState as_set{state, now};
+    if (job != nullptr) set_state(*job, kind, state, now);
     if (save_and_commit()) {
         forget_unrecorded(job_name, kind);
     } else {

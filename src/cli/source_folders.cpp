@@ -7,10 +7,14 @@
 #include "common/run_options.h"
 #include "platform/device.h"
 
+#include <array>
+#include <cerrno>
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
+#include <optional>
 #include <string_view>
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace bakjob
@@ -79,6 +83,33 @@ bool fill_buffers(const std::string &remote_backup_root, const char *share, cons
            copy_text(share_subdir, place_below(share + SHARE_PATH, folder));
 }
 
+struct SerialFile {
+    std::optional<std::string> text; // the first line as it was read
+    std::string refusal;             // why a file that is there has none
+};
+
+// Its folder is open to all, and its text leads root's writes on the remote side to their place.
+SerialFile read_serial_file()
+{
+    struct stat status = {};
+    if (lstat(SERIAL_FILE, &status) != 0) {
+        return {std::nullopt,
+                errno == ENOENT ? "" : std::string("it cannot be read: ") + std::strerror(errno)};
+    }
+    UniqueFd opened = open_own_file(SERIAL_FILE, O_RDONLY);
+    const bool others_write =
+        opened && (fstat(opened.get(), &status) != 0 || (status.st_mode & (S_IWGRP | S_IWOTH)) != 0);
+    const UniqueFile file(opened && !others_write ? fdopen(opened.get(), "r") : nullptr);
+    if (!file) return {std::nullopt, "it is not a plain file that root alone may write"};
+    opened.release();
+    std::array<char, SERIAL_SIZE> line{};
+    if (std::fgets(line.data(), line.size(), file.get()) == nullptr) line[0] = '\0';
+    const std::string text = line.data();
+    const bool leads_elsewhere = contains(text, "/") || text == "." || text == "..";
+    if (leads_elsewhere) return {std::nullopt, "its text is no name for a folder"};
+    return {text, ""};
+}
+
 } // namespace
 
 void rsync_split_folders(RsyncJob &job, FolderTable &table)
@@ -107,13 +138,16 @@ int rsync_resolve_folder(const std::string &remote_backup_root, const std::strin
 
 std::string rsync_remote_root(const JobName &job)
 {
-    char serial[SERIAL_SIZE] = "";
-    rsync_read_serial(serial);
-    if (std::strpbrk(serial, "\r\n") != nullptr) {
+    const SerialFile file = read_serial_file();
+    const std::string serial = file.text.value_or("");
+    if (!file.refusal.empty()) {
+        DebugLog("ERROR: serial text of [%s] not used: %s\n", SERIAL_FILE, file.refusal.c_str());
+    }
+    if (serial.find_first_of("\r\n") != std::string::npos) {
         DebugLog("ERROR: line break in the serial text of [%s]: no remote folder can be named\n",
                  SERIAL_FILE);
     }
-    return format_text("/%s_remote_backup/%s", serial, job.c_str());
+    return format_text("/%s_remote_backup/%s", serial.c_str(), job.c_str());
 }
 
 bool rsync_set_ends(RsyncJob &job, const std::string &folder)
@@ -137,19 +171,20 @@ void rsync_write_progress(const JobName &job, const std::string &folder, int ind
 
 void rsync_remove_progress(const JobName &job)
 {
-    unlink(progress_file(job).c_str());
+    std::remove(progress_file(job).c_str());
 }
 
 int rsync_read_serial(char (&serial)[SERIAL_SIZE])
 {
-    // Not waiting: anybody may have put a pipe of that name there.
-    UniqueFd opened(open(SERIAL_FILE, O_RDONLY | O_NONBLOCK | O_CLOEXEC));
-    const UniqueFile file(opened ? fdopen(opened.get(), "r") : nullptr);
-    if (!file) return -1;
-    opened.release();
-    serial[0] = '\0';
-    if (std::fgets(serial, sizeof serial, file.get()) == nullptr) serial[0] = '\0';
+    const SerialFile file = read_serial_file();
+    if (!file.text) return -1;
+    copy_text(serial, *file.text);
     return 0;
+}
+
+std::string rsync_serial_refusal()
+{
+    return read_serial_file().refusal;
 }
 
 } // namespace bakjob

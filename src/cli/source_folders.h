@@ -43,7 +43,11 @@ void rsync_write_progress(const JobName &job, const std::string &folder, int ind
 void rsync_remove_progress(const JobName &job);
 
 // Reads the device's serial text: the first line of its file, line break included, at most 127 bytes. -1, and
-// the buffer untouched, when the file cannot be opened.
+// the buffer untouched, when there is none or it is refused.
 int rsync_read_serial(char (&serial)[SERIAL_SIZE]);
+
+// Why the serial file is refused: others than root could have written it, or its text leads elsewhere. Empty
+// when it is not.
+std::string rsync_serial_refusal();
 
 } // namespace bakjob

@@ -21,7 +21,7 @@ char last_message[1024]; // empty: nothing was written to the file yet
 
 void append_to_file(const char *format, va_list arguments)
 {
-    if (last_message[0] == '\0') unlink(TRACE_FILE);
+    if (last_message[0] == '\0') std::remove(TRACE_FILE);
     std::vsnprintf(last_message, sizeof last_message, format, arguments);
     // Commands are traced with their passwords, so nobody else may read the file.
     UniqueFd file = create_file(TRACE_FILE, 0600);

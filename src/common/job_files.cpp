@@ -61,6 +61,11 @@ std::string snapshot_name(std::string_view job_name, std::int64_t number)
     return snapshot_prefix(job_name) + std::to_string(number);
 }
 
+std::string snapshot_path(std::string_view folder, std::string_view job_name, std::int64_t number)
+{
+    return std::string(folder) + '/' + snapshot_name(job_name, number);
+}
+
 bool is_snapshot_name(std::string_view job_name, std::string_view entry)
 {
     return entry != "." && entry != ".." && entry.starts_with(snapshot_prefix(job_name));

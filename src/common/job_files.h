@@ -14,6 +14,8 @@ namespace bakjob
 
 inline constexpr const char *CONFIG_FILE = "/etc/NAS_CFG/config.xml";
 inline constexpr const char *CONFIG_LOCK_FILE = "/tmp/rsync_write_conf.lock";
+// Locked by whoever replaces what stands at a lock's name (config/config_lock.h).
+inline constexpr const char *LOCK_GUARD_FILE = "/var/run/bakjob_lock.guard";
 inline constexpr const char *SERIAL_FILE = "/tmp/kv_serial.txt";
 inline constexpr const char *TRACE_FILE = "/tmp/rsync_debug";
 
@@ -36,6 +38,7 @@ inline constexpr const char *DISCOVERY_LOCK_FILE = "/tmp/remote_rinfo.lock";
 // Name of a snapshot folder inside the job's local folder: the job's name (or "backup") and the number, 0 the
 // newest, with a full stop between them.
 std::string snapshot_name(std::string_view job_name, std::int64_t number);
+std::string snapshot_path(std::string_view folder, std::string_view job_name, std::int64_t number);
 
 // Whether a folder entry is a snapshot of the job by its name alone: anything may follow the full stop.
 bool is_snapshot_name(std::string_view job_name, std::string_view entry);

@@ -1,6 +1,7 @@
 #include "common/private_file.h"
 
 #include <cerrno>
+#include <cstdio>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -18,7 +19,7 @@ UniqueFd create_file(const std::string &path, mode_t mode)
 
 bool replace_file(const std::string &path, mode_t mode, std::string_view contents)
 {
-    unlink(path.c_str());
+    std::remove(path.c_str());
     const UniqueFd file = create_file(path, mode);
     if (!file) return false;
     if (write_all(file.get(), contents)) return true;

@@ -16,8 +16,8 @@ namespace bakjob
 // cannot be made.
 UniqueFd create_file(const std::string &path, mode_t mode);
 
-// Removes what stands at `path`, makes the file anew and writes `contents`. False (errno) on failure; a file
-// that could not be written whole is removed.
+// Removes what stands at `path`, be it an empty folder, makes the file anew and writes `contents`. False
+// (errno) on failure; a file that could not be written whole is removed.
 bool replace_file(const std::string &path, mode_t mode, std::string_view contents);
 
 // Opens an existing regular file that belongs to this user and has no second name. Never waits, not even for

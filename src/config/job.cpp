@@ -5,12 +5,15 @@
 
 #include <algorithm>
 #include <array>
+#include <type_traits>
 
 namespace bakjob
 {
 
 namespace
 {
+
+static_assert(std::is_standard_layout_v<RsyncJob>, "fields are found by their offsets");
 
 #define INTEGER(name) .key = #name, .offset = offsetof(RsyncJob, name), .size = 0
 #define TEXT(name) .key = #name, .offset = offsetof(RsyncJob, name), .size = sizeof(RsyncJob::name)
@@ -87,12 +90,19 @@ bool has_whole_texts(const RsyncJob &job)
     return true;
 }
 
-bool was_cut(const RsyncJob &job, std::string_view key)
+const std::string *whole_text_of(const RsyncJob &job, std::string_view key)
 {
-    for (std::size_t i = 0; i < FIELDS.size(); ++i) {
-        if (key == FIELDS[i].key) return (job.cut_fields >> i & 1U) != 0;
-    }
-    return false;
+    if (!job.whole_texts) return nullptr;
+    const auto found = job.whole_texts->find(key);
+    return found == job.whole_texts->end() ? nullptr : &found->second;
+}
+
+void forget_whole_text(RsyncJob &job, std::string_view key)
+{
+    if (!was_cut(job, key)) return;
+    WholeTexts rest = *job.whole_texts;
+    rest.erase(rest.find(key));
+    job.whole_texts = std::make_shared<const WholeTexts>(std::move(rest));
 }
 
 void rsync_copy_job(RsyncJob &destination, const RsyncJob &source)
@@ -104,7 +114,7 @@ void rsync_copy_job(RsyncJob &destination, const RsyncJob &source)
             copy_text(text_field(destination, field), field.size, text_field(source, field));
         }
     }
-    destination.cut_fields = source.cut_fields;
+    destination.whole_texts = source.whole_texts;
 }
 
 int snapshots_kept(int inc_number)

@@ -8,7 +8,11 @@
 #include <climits>
 #include <cstddef>
 #include <cstdint>
+#include <functional>
+#include <map>
+#include <memory>
 #include <span>
+#include <string>
 #include <string_view>
 
 namespace bakjob
@@ -21,6 +25,9 @@ enum ServerType : std::int32_t { SERVER_SAME_KIND = 1, SERVER_ANY = 2 };
 enum BackupType : std::int32_t { BACKUP_PUSH = 1, BACKUP_PULL = 2 };
 enum ScheduleMode : std::int32_t { SCHEDULE_TIMETABLE = 1, SCHEDULE_ONCE = 2, SCHEDULE_EVENT = 3 };
 enum RsyncMode : std::int32_t { RSYNC_MODE_SHELL = 1, RSYNC_MODE_DAEMON = 2 };
+
+// Texts of a job, by key, of which the store has more than the job's field holds.
+using WholeTexts = std::map<std::string, std::string, std::less<>>;
 
 struct RsyncJob {
     std::int32_t enable;
@@ -54,7 +61,7 @@ struct RsyncJob {
     char rlast_do_job_time[32];
     char in_remote_cloud_fqdn[32];
     RsyncJob *next;
-    std::uint32_t cut_fields; // bit i: the store has more of the text job_fields()[i] than fits here
+    std::shared_ptr<const WholeTexts> whole_texts; // null: every text is whole
 };
 
 // One field of the record, in the order in which the store keeps the keys.
@@ -78,8 +85,16 @@ const char *text_field(const RsyncJob &job, const JobField &field);
 // False, with a trace, when a text that commands need was cut.
 bool has_whole_texts(const RsyncJob &job);
 
-// Whether the store had to cut the field of that key.
-bool was_cut(const RsyncJob &job, std::string_view key);
+// The text of that key as the store has it, when it had to be cut; else null.
+const std::string *whole_text_of(const RsyncJob &job, std::string_view key);
+
+inline bool was_cut(const RsyncJob &job, std::string_view key)
+{
+    return whole_text_of(job, key) != nullptr;
+}
+
+// For a field that has got another text.
+void forget_whole_text(RsyncJob &job, std::string_view key);
 
 // Copies every field but `next`.
 void rsync_copy_job(RsyncJob &destination, const RsyncJob &source);

@@ -15,7 +15,8 @@ namespace
 // A save that fails is not the operations' to tell.
 int change_jobs(const std::function<bool()> &change)
 {
-    return rsync_change_jobs(change) == JobChange::NONE ? 0 : 1;
+    const JobChange made = rsync_change_jobs(change);
+    return made == JobChange::SAVED || made == JobChange::NOT_SAVED ? 1 : 0;
 }
 
 int change_job(const std::string &job_name, const std::function<bool(RsyncJob &)> &change)
@@ -49,10 +50,14 @@ int read_job(const std::string &job_name, const std::function<void(const RsyncJo
 
 } // namespace
 
-JobChange rsync_change_jobs(const std::function<bool()> &change)
+JobChange rsync_change_jobs(const std::function<bool()> &change, WithoutLock without_lock)
 {
     const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
-    rsync_load_jobs();
+    if (!lock && without_lock == WithoutLock::REFUSE) return JobChange::NOT_LOCKED;
+    if (!rsync_load_jobs()) {
+        rsync_free_jobs();
+        return JobChange::NOT_LOADED;
+    }
     if (!change()) {
         rsync_free_jobs();
         return JobChange::NONE;

@@ -2,7 +2,8 @@
 
 // Whole-job operations for the other parts of the appliance. Each is one complete cycle over the
 // configuration store and leaves the job list empty. They answer 1 for success and 0 when the job was not
-// found or the change was refused; then the store is as it was. None copies the configuration to flash.
+// found, the change was refused, or the jobs could not all be loaded; then the store is as it was. None
+// copies the configuration to flash.
 
 #include "config/job.h"
 
@@ -15,12 +16,18 @@ namespace bakjob
 enum class JobChange {
     NONE, // `change` did not want it
     SAVED,
-    NOT_SAVED // the configuration file could not be written and is as it was
+    NOT_LOCKED, // no lock could be had (errno), nothing was done
+    NOT_LOADED, // rsync_load_failure tells why; nothing was done
+    NOT_SAVED   // a value could not be set, or the configuration file could not be written
 };
+
+// What a change does when the configuration lock cannot be had.
+enum class WithoutLock { GO_ON, REFUSE };
 
 // The cycle behind the operations, for a change that none of them makes: `change` works on the loaded job
 // list and says whether to save it. Nobody else changes a job meanwhile.
-JobChange rsync_change_jobs(const std::function<bool()> &change);
+JobChange rsync_change_jobs(const std::function<bool()> &change,
+                            WithoutLock without_lock = WithoutLock::GO_ON);
 
 // Change one job. Hold the configuration lock from the load to the save; block while another holds it.
 int rsync_enable_job(const std::string &job_name);

@@ -1,5 +1,6 @@
 #include "config/job_store.h"
 
+#include "common/debug_log.h"
 #include "common/job_files.h"
 #include "common/text.h"
 #include "config/job_list.h"
@@ -9,8 +10,8 @@
 
 #include <cstdio>
 #include <cstring>
-#include <map>
 #include <memory>
+#include <new>
 #include <string_view>
 #include <unordered_set>
 #include <utility>
@@ -23,34 +24,55 @@ namespace
 
 constexpr const char *JOBS = "/backup_mgr/rsync";
 constexpr const char *JOB_COUNT = "/backup_mgr/rsync/count";
+constexpr int LONGEST_GAP = 1000; // items that are not there, one behind the other
 
-// The path of one key of one item; reused from key to key, as there are tens of thousands of them.
+constexpr const char *UNREADABLE = "the configuration cannot be read";
+constexpr const char *WRONG_COUNT = "/backup_mgr/rsync/count is missing or smaller than the number of items";
+constexpr const char *GAP = "/backup_mgr/rsync/count is much larger than the number of items";
+constexpr const char *NO_MEMORY = "there is not enough memory";
+constexpr const char *LONG_TEXT = "a text of a job is longer than 1 MiB";
+
+const char *load_failure = nullptr;
+
+// The path of one key of one item; reused from key to key, as there are tens of thousands of them. Made
+// without memory of its own: a save that has begun must not end there.
 class ItemPath
 {
 public:
-    explicit ItemPath(int item) : path_(format_text("%s/item:%d/", JOBS, item)), length_(path_.size()) {}
+    explicit ItemPath(int item) : key_(std::snprintf(path_, sizeof path_, "%s/item:%d/", JOBS, item)) {}
     const char *key(const char *name)
     {
-        path_.resize(length_);
-        path_ += name;
-        return path_.c_str();
+        std::snprintf(path_ + key_, sizeof path_ - static_cast<std::size_t>(key_), "%s", name);
+        return path_;
     }
 
 private:
-    std::string path_;
-    std::size_t length_;
+    char path_[128];
+    int key_;
 };
 
-// Texts that did not fit their field, by job and key, from the load to the save: the job cannot use them, but
-// a save for another job's sake must not lose them.
-std::map<std::pair<std::string, std::string>, std::string> uncut_texts;
+// What the store answers for an item: negative when there is none. Paths with a number are read from the tree
+// that the count came from, so that one which could not be read does not seem whole by being read again.
+int look_for_item(int item)
+{
+    char start[2] = "";
+    return xml_get_str(format_text("%s/item:%d", JOBS, item).c_str(), sizeof start, start);
+}
 
 const char *text_to_save(const RsyncJob &job, const JobField &field)
 {
     const char *const text = text_field(job, field);
-    if (std::strlen(text) < field.size - 1) return text;
-    const auto uncut = uncut_texts.find({job.job_name, field.key});
-    return uncut != uncut_texts.end() && uncut->second.starts_with(text) ? uncut->second.c_str() : text;
+    const std::string *const whole = whole_text_of(job, field.key);
+    return whole != nullptr && std::strlen(text) == field.size - 1 && whole->starts_with(text)
+               ? whole->c_str()
+               : text;
+}
+
+// Whether the field has all of the text at the path.
+bool load_text(char *text, std::size_t size, const char *path)
+{
+    xml_get_str(path, static_cast<int>(size), text);
+    return std::strlen(text) < size - 1 || store_text(path, size + 1).size() < size;
 }
 
 // Whether the store has anything of the item.
@@ -58,7 +80,7 @@ bool load_job(RsyncJob &job, int item)
 {
     ItemPath path(item);
     bool found = false;
-    std::uint32_t bit = 1;
+    WholeTexts whole_texts;
     for (const JobField &field : job_fields()) {
         const char *const key = path.key(field.key);
         if (field.size == 0) {
@@ -68,67 +90,120 @@ bool load_job(RsyncJob &job, int item)
             found |= value != -1;
         } else {
             char *const text = text_field(job, field);
-            xml_get_str(key, static_cast<int>(field.size), text);
-            const std::size_t length = std::strlen(text);
-            // A text that fills its field may be the start of a longer one.
-            const bool full = length == field.size - 1;
-            if (full && store_text(key, field.size + 1).size() == field.size) job.cut_fields |= bit;
-            found |= length > 0;
+            if (!load_text(text, field.size, key)) whole_texts[field.key] = whole_text(key);
+            found |= text[0] != '\0';
         }
-        bit <<= 1;
     }
+    if (!whole_texts.empty()) job.whole_texts = std::make_shared<const WholeTexts>(std::move(whole_texts));
     return found;
 }
 
-void keep_uncut_texts(const RsyncJob &job, int item)
+bool has_endless_text(const RsyncJob &job)
 {
-    ItemPath path(item);
-    for (const JobField &field : job_fields()) {
-        if (was_cut(job, field.key)) uncut_texts[{job.job_name, field.key}] = whole_text(path.key(field.key));
+    if (!job.whole_texts) return false;
+    for (const auto &[key, text] : *job.whole_texts) {
+        if (is_cut(text)) return true;
+    }
+    return false;
+}
+
+class JobLoader
+{
+public:
+    // Null, or why something is left out.
+    const char *load()
+    {
+        const int count = xml_get_int(JOB_COUNT);
+        int item = 1;
+        for (; item <= count && missing_ < LONGEST_GAP; ++item) {
+            try {
+                load_item(item);
+            } catch (const std::bad_alloc &) {
+                failure_ = NO_MEMORY;
+            }
+        }
+        if (missing_ >= LONGEST_GAP) return GAP;
+        const int behind = look_for_item(item);
+        if (behind == XML_UNREADABLE) return UNREADABLE;
+        return behind >= 0 ? WRONG_COUNT : failure_;
+    }
+
+private:
+    void load_item(int item)
+    {
+        auto job = std::make_unique<RsyncJob>();
+        missing_ = load_job(*job, item) ? 0 : missing_ + 1;
+        if (!names_.insert(job->job_name).second) return;
+        if (has_endless_text(*job)) failure_ = LONG_TEXT;
+        rsync_list_take_job(std::move(job));
+    }
+
+    std::unordered_set<std::string> names_; // of the listed jobs
+    int missing_ = 0;
+    const char *failure_ = nullptr;
+};
+
+const char *load_or_say_why()
+{
+    try {
+        return JobLoader().load();
+    } catch (const std::bad_alloc &) {
+        return NO_MEMORY;
     }
 }
 
-void save_job(const RsyncJob &job, int item)
+bool save_job(const RsyncJob &job, int item)
 {
     ItemPath path(item);
+    bool set = true;
     for (const JobField &field : job_fields()) {
         const char *const key = path.key(field.key);
-        if (field.size == 0) {
-            xml_set_int(key, integer_field(job, field));
-        } else {
-            xml_set_str(key, text_to_save(job, field));
-        }
+        const int answer = field.size == 0 ? xml_set_int(key, integer_field(job, field))
+                                           : xml_set_str(key, text_to_save(job, field));
+        set &= answer >= 0;
     }
+    return set;
+}
+
+// Whether the store has taken all of them.
+bool save_list()
+{
+    bool set = xml_del(JOBS) != XML_UNREADABLE;
+    if (rsync_job_list_empty() == 0) set &= xml_set_int(JOB_COUNT, job_list->count) >= 0;
+    int item = 0;
+    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+        set &= save_job(*job, ++item);
+    }
+    return set;
 }
 
 } // namespace
 
-void rsync_load_jobs()
+bool rsync_load_jobs()
 {
     rsync_free_jobs();
-    uncut_texts.clear();
-    std::unordered_set<std::string_view> names; // of the listed records
-    const int count = xml_get_int(JOB_COUNT);
-    for (int item = 1; item <= count; ++item) {
-        std::unique_ptr<RsyncJob> job(rsync_new_job());
-        if (!job) break;
-        const bool found = load_job(*job, item);
-        const bool is_new = names.insert(job->job_name).second;
-        // Behind an item that is not there is none, whatever the count says.
-        if (!found && !is_new) break;
-        if (!is_new) continue;
-        if (job->cut_fields != 0) keep_uncut_texts(*job, item);
-        rsync_list_take_job(std::move(job));
-    }
+    load_failure = load_or_say_why();
+    if (load_failure == nullptr) return true;
+    DebugLog("ERROR: jobs are left out: %s\n", load_failure);
+    return false;
+}
+
+const char *rsync_load_failure()
+{
+    return load_failure;
 }
 
 bool rsync_save_jobs()
 {
-    xml_del(JOBS);
-    if (rsync_job_list_empty() == 0) xml_set_int(JOB_COUNT, job_list->count);
-    int item = 0;
-    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
-        save_job(*job, ++item);
+    if (load_failure != nullptr) {
+        DebugLog("ERROR: jobs are not saved: %s\n", load_failure);
+        rsync_free_jobs();
+        return false;
+    }
+    if (!save_list()) {
+        DebugLog("ERROR: jobs are not saved: a value could not be set\n");
+        rsync_free_jobs();
+        return false;
     }
     const bool handed_over = rsync_prune_schedule();
     rsync_free_jobs(); // before the write, which can use their memory

@@ -9,10 +9,14 @@
 #include "config/current_job.h"
 #include "remote/ssh_login.h"
 
+#include <algorithm>
 #include <cerrno>
+#include <csignal>
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace bakjob
@@ -23,6 +27,60 @@ namespace
 
 constexpr std::string_view PATH_KEY = "path = ";
 constexpr int MOST_TESTS = 10;
+constexpr off_t MOST_BYTES = off_t{1024} * 1024; // of a configuration: the remote side may never end it
+
+// Size of the file behind a handle; 0 when that is no plain file.
+off_t file_size(int fd)
+{
+    struct stat status = {};
+    return fstat(fd, &status) == 0 && S_ISREG(status.st_mode) ? status.st_size : 0;
+}
+
+// While this lives, a command that makes a file larger than so many bytes is ended by the kernel, without a
+// memory image, which would hold the password. A log that its messages go to may be longer already.
+class FileSizeLimit
+{
+public:
+    FileSizeLimit()
+    {
+        lower(RLIMIT_FSIZE, size_, MOST_BYTES + std::max(file_size(STDOUT_FILENO), file_size(STDERR_FILENO)));
+        lower(RLIMIT_CORE, core_, 0);
+        struct sigaction action = {};
+        action.sa_handler = SIG_DFL; // as the command inherits it
+        sigaction(SIGXFSZ, &action, &signal_);
+    }
+    FileSizeLimit(const FileSizeLimit &) = delete;
+    FileSizeLimit &operator=(const FileSizeLimit &) = delete;
+    ~FileSizeLimit()
+    {
+        sigaction(SIGXFSZ, &signal_, nullptr);
+        setrlimit(RLIMIT_FSIZE, &size_);
+        setrlimit(RLIMIT_CORE, &core_);
+    }
+
+private:
+    static void lower(decltype(RLIMIT_FSIZE) what, rlimit &before, off_t limit)
+    {
+        getrlimit(what, &before);
+        const rlimit now{.rlim_cur = std::min(before.rlim_cur, static_cast<rlim_t>(limit)),
+                         .rlim_max = before.rlim_max};
+        setrlimit(what, &now);
+    }
+
+    rlimit size_ = {};
+    rlimit core_ = {};
+    struct sigaction signal_ = {};
+};
+
+// False, with a trace and the file removed, when it is as large as it could become.
+bool is_whole(const std::string &local_copy)
+{
+    struct stat status = {};
+    if (lstat(local_copy.c_str(), &status) != 0 || status.st_size < MOST_BYTES) return true;
+    DebugLog("ERROR: [%s] refused: larger than 1 MiB\n", local_copy.c_str());
+    std::remove(local_copy.c_str());
+    return false;
+}
 
 void wait_a_second()
 {
@@ -86,8 +144,11 @@ bool fetch_daemon_config(const std::string &local_copy)
         return false;
     }
     DebugLog("[%s]\n", command->c_str());
-    run_shell(*command);
-    return wait_for_file(local_copy);
+    {
+        const FileSizeLimit limit;
+        run_shell(*command);
+    }
+    return is_whole(local_copy) && wait_for_file(local_copy);
 }
 
 } // namespace bakjob

@@ -24,8 +24,8 @@ std::optional<std::string> path_of_line(std::string_view line);
 bool read_daemon_config(const std::string &local_copy, const std::function<bool(const std::string &)> &line);
 
 // Fetches the remote host's "/etc/rsyncd.conf" over ssh into `local_copy` (CurrentJob's host and password)
-// and waits, up to about ten seconds, for the copy to be there. False when it is not, or a value is refused.
-// The caller removes the copy.
+// and waits, up to about ten seconds, for the copy to be there. False when it is not, or a value is refused,
+// or it has 1 MiB or more, of which no more is fetched. The caller removes the copy.
 bool fetch_daemon_config(const std::string &local_copy);
 
 } // namespace bakjob

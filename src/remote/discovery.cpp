@@ -12,6 +12,7 @@
 #include "remote/sizes.h"
 #include "remote/ssh_login.h"
 
+#include <cstdio>
 #include <unistd.h>
 
 namespace bakjob
@@ -115,7 +116,7 @@ bool find_configured_modules()
     const UniqueFd lock = rsync_lock_config(DISCOVERY_LOCK_FILE);
     if (!fetch_daemon_config(DISCOVERY_CONFIG_COPY)) return false;
     const bool read = add_configured_modules(DISCOVERY_CONFIG_COPY);
-    unlink(DISCOVERY_CONFIG_COPY);
+    std::remove(DISCOVERY_CONFIG_COPY);
     sync();
     return read;
 }

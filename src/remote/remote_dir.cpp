@@ -7,6 +7,7 @@
 #include "remote/daemon_config.h"
 #include "remote/ssh_login.h"
 
+#include <cstdio>
 #include <unistd.h>
 
 namespace bakjob
@@ -50,10 +51,10 @@ int make_remote_dir(const std::string &folder, const std::string &target)
 std::optional<std::string> rsync_find_module_folder(const JobName &job, const std::string &module)
 {
     const std::string local_copy = remote_config_copy(job);
-    unlink(local_copy.c_str());
+    std::remove(local_copy.c_str());
     if (!fetch_daemon_config(local_copy)) return std::nullopt;
     auto folder = module_folder(local_copy, module);
-    unlink(local_copy.c_str());
+    std::remove(local_copy.c_str());
     sync();
     return folder;
 }

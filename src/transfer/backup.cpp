@@ -13,15 +13,20 @@
 #include "remote/daemon_test.h"
 #include "remote/remote_dir.h"
 #include "remote/ssh_test.h"
+#include "transfer/row_guard.h"
 #include "transfer/rsync_command.h"
 #include "transfer/snapshot.h"
+#include "transfer/snapshot_mark.h"
 
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
+#include <fcntl.h>
 #include <optional>
 #include <sys/select.h>
+#include <sys/stat.h>
 #include <unistd.h>
-#include <utime.h>
+#include <vector>
 
 namespace bakjob
 {
@@ -29,16 +34,12 @@ namespace bakjob
 namespace
 {
 
-constexpr int RSYNC_PARTIAL = 23; // some files could not be transferred: trying again does not help
+constexpr int LOCAL_SIDE_REFUSED = -2; // no command ends so
+constexpr int RSYNC_PARTIAL = 23;      // some files could not be transferred: trying again does not help
 
 bool is_recover_run()
 {
     return run_options.recover_seq != 0;
-}
-
-bool keeps_snapshots(const RsyncJob &job)
-{
-    return job.inc_enable == 1 && !is_recover_run() && job.backup_type == BACKUP_PULL;
 }
 
 // Makes the folder that the write test missed, where that is possible. Whether the run may go on.
@@ -78,19 +79,29 @@ std::string dry_run_of(const std::string &command)
     return with_dump_size(command) + " --dry-run >/dev/null 2>&1";
 }
 
+// Where a run works on this device.
+struct LocalSide {
+    std::vector<std::string> folders; // whatever stands at their paths must be folders
+    std::string newest;               // snapshot that the transfer writes into; empty when it makes none
+};
+
 // Up to `retry` passes, at least one, each a dry run and, if that went well, the transfer. The exit code of
-// the last command.
-int transfer_with_retries(const JobName &job_name, const RsyncJob &job, const std::string &command)
+// the last command, or LOCAL_SIDE_REFUSED.
+int transfer_with_retries(const JobName &job_name, const RsyncJob &job, const std::string &command,
+                          const LocalSide &local)
 {
     const std::string dry_run = dry_run_of(command);
     DebugLog("rsync_cmd = [%s]\n", dry_run.c_str());
     int attempts_left = job.retry;
     for (;;) {
+        if (!are_folders(local.folders)) return LOCAL_SIDE_REFUSED;
         int code = exit_code(run_shell(dry_run));
         if (code == 0 || code == RSYNC_PARTIAL) {
+            if (!are_folders(local.folders)) return LOCAL_SIDE_REFUSED;
+            if (!local.newest.empty() && !take_mark_away(local.newest)) return LOCAL_SIDE_REFUSED;
             code = exit_code(run_shell(with_dump_size(command)));
         } else {
-            unlink(transfer_size_file(job_name).c_str());
+            std::remove(transfer_size_file(job_name).c_str());
         }
         --attempts_left;
         if (code == 0 || code == RSYNC_PARTIAL || attempts_left <= 0) return code;
@@ -112,7 +123,7 @@ std::optional<std::string> rsync_transfer_command(const RsyncJob &job)
 
 bool rsync_write_password_file()
 {
-    unlink(CurrentJob.rsync_pwd_file);
+    std::remove(CurrentJob.rsync_pwd_file);
     char password[PASSWORD_SIZE] = "";
     const bool encoded = CurrentJob.pwd_encoded != 0;
     const bool wants_plain = CurrentJob.server_type == SERVER_ANY;
@@ -149,24 +160,34 @@ BackupResult rsync_run_backup(const JobName &job_name, RsyncJob &job)
         return BACKUP_FAILED;
     }
     if (!has_whole_texts(job)) return BACKUP_FAILED;
+    LocalSide local{snapshots_in_use(job), ""};
+    if (!are_folders(local.folders)) return BACKUP_FAILED;
     if (job.use_ssh == 1 && ssh_test() != SSH_OK) return BACKUP_SSH_FAILED;
     // Without its password file a daemon transfer could only fail, or worse, take somebody else's.
     if (!rsync_write_password_file() && job.rsync_mode == RSYNC_MODE_DAEMON) return BACKUP_FAILED;
     if (const auto failure = check_remote_side(job_name, job)) return *failure;
 
+    // The command names the contents of a folder, and those of one behind a link just as well.
+    const auto names_folder = is_folder(job.local_path);
+    if (!names_folder) return BACKUP_FAILED;
+    if (*names_folder) local.folders.emplace_back(job.local_path);
     const auto command = rsync_transfer_command(job);
     if (!command) return BACKUP_FAILED;
-    unlink(transfer_file(job_name).c_str());
+    std::remove(transfer_file(job_name).c_str());
     if (keeps_snapshots(job)) {
         DebugLog("run rsync_snapshot_rotate() %s %d\n", job.local_path, job.inc_number);
-        rsync_snapshot_rotate(job.local_path, job.inc_number, job.job_name);
+        if (!are_folders(local.folders)) return BACKUP_FAILED;
+        if (!rsync_snapshot_rotate(job.local_path, job.inc_number, job.job_name)) return BACKUP_FAILED;
+        local.newest = snapshot_path(job.local_path, job.job_name, 0);
     }
     DebugLog("rsync_cmd = [%s]\n", command->c_str());
     rsync_set_job_state(job_name.text(), is_recover_run() ? JOB_RECOVER_RUNNING : JOB_RUNNING);
-    const int code = transfer_with_retries(job_name, job, *command);
-    if (keeps_snapshots(job)) {
+    const int code = transfer_with_retries(job_name, job, *command, local);
+    if (!local.newest.empty()) {
         DebugLog("inc_root_path = [%s]\n", run_options.inc_root_path);
-        utime(run_options.inc_root_path, nullptr);
+        if (!are_folders(local.folders)) return BACKUP_FAILED;
+        utimensat(AT_FDCWD, run_options.inc_root_path, nullptr, AT_SYMLINK_NOFOLLOW);
+        if (code == 0) write_out_and_mark_whole(local.newest);
     }
     return code == 0 ? BACKUP_DONE : BACKUP_FAILED;
 }

@@ -4,13 +4,13 @@
 #include "common/debug_log.h"
 #include "common/excludes.h"
 #include "common/job_files.h"
-#include "common/private_file.h"
 #include "common/run_options.h"
 #include "common/shell.h"
 #include "common/shell_text.h"
 #include "common/text.h"
 #include "config/current_job.h"
 #include "remote/ssh_login.h"
+#include "transfer/row_guard.h"
 
 namespace bakjob
 {
@@ -75,11 +75,6 @@ std::optional<std::string> options(const RsyncJob &job)
     return text;
 }
 
-std::string snapshot_path(const RsyncJob &job, std::int64_t number)
-{
-    return std::string(job.local_path) + '/' + snapshot_name(job.job_name, number);
-}
-
 // User, host and the colons: everything in front of the remote path.
 std::string endpoint(const RsyncJob &job)
 {
@@ -99,14 +94,17 @@ std::optional<std::string> rsync_build_command(const RsyncJob &job)
     if (!option_text || !remote_path) return std::nullopt;
 
     // Only a directory, not a link to one, is copied by its contents.
-    const std::string slash = is_directory(job.local_path) ? "/" : "";
+    const auto names_folder = is_folder(job.local_path);
+    if (!names_folder) return std::nullopt;
+    const std::string slash = *names_folder ? "/" : "";
     const bool recover = run_options.recover_seq != 0;
     const bool pull = !recover && job.backup_type != BACKUP_PUSH;
     std::string local = job.local_path + slash;
     if (recover) {
-        local = snapshot_path(job, std::int64_t{run_options.recover_seq} - 1) + '/';
+        const std::int64_t number = std::int64_t{run_options.recover_seq} - 1;
+        local = snapshot_path(job.local_path, job.job_name, number) + '/';
     } else if (job.backup_type == BACKUP_PULL && job.inc_enable == 1) {
-        local = snapshot_path(job, 0);
+        local = snapshot_path(job.local_path, job.job_name, 0);
     }
     const auto local_end = shell_path("local_path", local);
     if (!local_end) return std::nullopt;

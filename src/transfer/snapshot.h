@@ -13,9 +13,10 @@ namespace bakjob
 std::string rotation_command(const std::string &escaped_folder, const std::string &job_name, int number,
                              int top);
 
-// Rotates the snapshots in `local_path` (`inc_number` of them, brought within 3 to 10), each with its times,
-// and sets `inc_root_path` to snapshot 0. Failed steps are not looked at. Nothing is done when the path is
-// empty or refused.
-void rsync_snapshot_rotate(const std::string &local_path, int inc_number, const std::string &job_name);
+// Rotates the snapshots in `local_path` (`inc_number` of them, brought within 3 to 10), each with its times
+// and its mark (snapshot_mark.h), and sets `inc_root_path` to snapshot 0. Nothing is done when the path is
+// empty or refused. A step that fails is traced, what it leaves is not marked, and the others are done. False
+// when nothing may be transferred now: a link or a file stands in the row, or a mark that must go stays.
+bool rsync_snapshot_rotate(const std::string &local_path, int inc_number, const std::string &job_name);
 
 } // namespace bakjob

@@ -1,0 +1,48 @@
+#include "read_lists.h"
+
+#include <algorithm>
+#include <iterator>
+
+namespace device
+{
+
+namespace
+{
+
+// Of "/list/item:2/name", and of "/list/count", it is "/list".
+std::string_view list_of(std::string_view path)
+{
+    const std::string_view plain = path.substr(0, path.find(':'));
+    return plain.substr(0, plain.rfind('/'));
+}
+
+bool is_within(std::string_view path, std::string_view list)
+{
+    return path.starts_with(list) && (path.size() == list.size() || path[list.size()] == '/');
+}
+
+} // namespace
+
+void ReadLists::read(std::string_view path)
+{
+    constexpr std::size_t MOST_LISTS = 64;
+    const std::string_view list = list_of(path);
+    std::erase(outdated_, list);
+    const bool known = std::find(current_.begin(), current_.end(), list) != current_.end();
+    if (!known && current_.size() < MOST_LISTS) current_.emplace_back(list);
+}
+
+void ReadLists::tree_changed()
+{
+    std::move(current_.begin(), current_.end(), std::back_inserter(outdated_));
+    current_.clear();
+}
+
+bool ReadLists::outdated(std::string_view path) const
+{
+    return std::any_of(outdated_.begin(), outdated_.end(), [&](const std::string &list) {
+        return list == list_of(path) || is_within(list, path);
+    });
+}
+
+} // namespace device
