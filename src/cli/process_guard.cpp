@@ -38,14 +38,6 @@ pid_t process_id_in(int file)
     return whole && pid > 0 ? pid : 0;
 }
 
-bool is_at(const std::string &path, int file)
-{
-    struct stat there = {};
-    struct stat here = {};
-    return lstat(path.c_str(), &there) == 0 && fstat(file, &here) == 0 && there.st_ino == here.st_ino &&
-           there.st_dev == here.st_dev;
-}
-
 // Whoever removes a pid file locks it first, so that it does not become another one between the look and the
 // removal. Everybody can read the file, so that everybody can lock it, too: nobody is waited for long.
 void lock_briefly(int file)

@@ -43,6 +43,14 @@ UniqueFd open_own_file(const std::string &path, int flags)
     return file;
 }
 
+bool is_at(const std::string &path, int file)
+{
+    struct stat there = {};
+    struct stat here = {};
+    return lstat(path.c_str(), &there) == 0 && fstat(file, &here) == 0 && there.st_ino == here.st_ino &&
+           there.st_dev == here.st_dev;
+}
+
 bool is_directory(const std::string &path)
 {
     struct stat status = {};

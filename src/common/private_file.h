@@ -20,6 +20,9 @@ UniqueFd create_file(const std::string &path, mode_t mode);
 // (errno) on failure; a file that could not be written whole is removed.
 bool replace_file(const std::string &path, mode_t mode, std::string_view contents);
 
+// Whether the open file is the one that stands at `path`, not one of that name that came later.
+bool is_at(const std::string &path, int file);
+
 // Opens an existing regular file that belongs to this user and has no second name. Never waits, not even for
 // a pipe of that name. No descriptor (errno) otherwise.
 UniqueFd open_own_file(const std::string &path, int flags);

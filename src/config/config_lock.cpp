@@ -42,14 +42,6 @@ bool is_lock(const struct stat &status)
     return is_own_file(status) && status.st_nlink == 1;
 }
 
-bool is_still_at(const char *path, int file)
-{
-    struct stat there = {};
-    struct stat here = {};
-    return lstat(path, &there) == 0 && fstat(file, &here) == 0 && there.st_ino == here.st_ino &&
-           there.st_dev == here.st_dev;
-}
-
 // What is waited is taken from `patience`; false when that is used up.
 bool flock_within(milliseconds &patience, int file)
 {
@@ -140,7 +132,7 @@ UniqueFd take_lock(const char *path)
         if (!lock) continue;
         if (!wait_for_flock(path, lock.get())) return UniqueFd();
         // Somebody may have replaced the file while we waited: then the lock is on the new one.
-        if (is_still_at(path, lock.get())) return lock;
+        if (is_at(path, lock.get())) return lock;
         errno = EBUSY;
     }
     return UniqueFd();
