@@ -131,6 +131,17 @@ TEST_F(WholeList, WhatBringsTheProgramDownIsRefused)
     expect_refused("longer than 1 MiB");
 }
 
+TEST_F(WholeList, AFileThatMayNotGrowIsAFailedWrite)
+{
+    const std::string flash = read_file(FLASH);
+    EXPECT_TRUE(
+        says(shell("(ulimit -f 1; exec /usr/sbin/bakjobctl set one retry=9) 2>&1"), 3, "File too large"));
+    shell("(ulimit -f 1; exec /usr/sbin/bakjob -r one)");
+    EXPECT_TRUE(read_file(STORE) == good_);
+    EXPECT_TRUE(read_file(FLASH) == flash);
+    EXPECT_TRUE(says(ctl("status one"), 0, "done, not recorded")) << "what the run came to";
+}
+
 TEST_F(WholeList, ALinkedFileAndItsOwnersRulesStay)
 {
     fs::rename(STORE, "/etc/NAS_CFG/real.xml");
