@@ -236,7 +236,7 @@ void Check::serial()
     char serial[SERIAL_SIZE] = "";
     const std::string refusal = rsync_serial_refusal();
     if (!refusal.empty()) {
-        problem(SERIAL_FILE, refusal + ", so the folder on the remote side is named without it",
+        problem(SERIAL_FILE, refusal + ", so every folder fails",
                 "Find out who wrote it, and let the appliance write it anew.");
     } else if (rsync_read_serial(serial) < 0 || *serial == '\0') {
         note(SERIAL_FILE, "it holds no serial text: the folder on the remote side has none in its name",
@@ -250,7 +250,7 @@ void Check::serial()
 void Check::folders()
 {
     if (!name_) return;
-    const std::string root = rsync_remote_root(*name_);
+    const std::string root = rsync_remote_root(*name_).value_or(""); // a refused one is a problem of its own
     const auto folders = folders_of(job_);
     if (folders.empty()) problem("local_path", "there is no folder", "bakjobctl set NAME local_path=FOLDER");
     for (const std::string &each : folders) {

@@ -67,7 +67,7 @@ class RemoteCheck
 {
 public:
     RemoteCheck(const RsyncJob &job, const JobName &name, const ProbeJob &probe, Findings &findings)
-        : job_(job), root_(rsync_remote_root(name)), probe_(probe), findings_(findings)
+        : job_(job), root_(rsync_remote_root(name).value_or("")), probe_(probe), findings_(findings)
     {
     }
 

@@ -160,9 +160,11 @@ TEST_F(ConfigStore, WritesOfOtherProcessesAreSeenBetweenWalks)
     EXPECT_EQ(xml_get_int("/list/count"), 1);
     EXPECT_EQ(text_at("/list/item:1/name"), "new");
 
-    // What was read from one file is not changed in another: its items may have other numbers now.
+    // What was read from one file is not changed in another where it is different: its items may have other
+    // numbers now.
     ASSERT_EQ(in_child([] {
                   xml_set_str("/other", "theirs");
+                  xml_set_str("/list/item:2/name", "theirs");
                   return xml_write_file(STORE);
               }),
               0);
@@ -181,6 +183,17 @@ TEST_F(ConfigStore, WritesOfOtherProcessesAreSeenBetweenWalks)
     EXPECT_EQ(text_at("/list/item:1/name"), "mine");
     ASSERT_EQ(xml_write_file(STORE), 0);
     EXPECT_EQ(text_at("/other"), "theirs");
+
+    // Elsewhere others may change what they like, also between a read and the change.
+    EXPECT_EQ(xml_get_int("/list/count"), 1);
+    ASSERT_EQ(in_child([] {
+                  xml_set_str("/other", "theirs again");
+                  return xml_write_file(STORE);
+              }),
+              0);
+    EXPECT_EQ(xml_set_str("/list/item:1/name", "mine again"), 0);
+    EXPECT_EQ(xml_write_file(STORE), 0);
+    EXPECT_EQ(text_at("/other") + text_at("/list/item:1/name"), "theirs againmine again");
 
     // Nor is a file written over that came after the reading.
     ASSERT_EQ(xml_set_str("/list/item:1/name", "again"), 0);

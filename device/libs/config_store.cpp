@@ -5,9 +5,9 @@
 // another one. Reads through a numbered step, "item:3/name", take the tree as it is: whoever walks a list has
 // read its count before, and must see the whole walk in one tree.
 //
-// Nor may what was read from one tree be changed in another. So a list that was read before the file changed
-// takes no change until it has been read anew, and the file is written only in the place of the one that was
-// read.
+// Nor may what was read from one tree be changed in another. So a list that was read before the file changed,
+// and is another one now, takes no change until it has been read anew, and the file is written only in the
+// place of the one that was read.
 
 #include "platform/config_store.h"
 
@@ -26,8 +26,10 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <map>
 #include <new>
 #include <pugixml.hpp>
+#include <set>
 
 using pugi::xml_node;
 
@@ -85,19 +87,63 @@ const char *load()
     }
 }
 
+xml_node plain_child(xml_node parent, std::string_view name)
+{
+    for (const xml_node child : parent.children()) {
+        if (child.type() == pugi::node_element && child.name() == name) return child;
+    }
+    return {};
+}
+
+std::string text_of_list(const std::string &list)
+{
+    xml_node node = store().document.document_element();
+    for (const Step &step : parse_store_path(list).used()) {
+        node = plain_child(node, step.name);
+    }
+    return raw_text_of(node);
+}
+
+using ListTexts = std::map<std::string, std::string>;
+
+ListTexts texts_of_current_lists()
+{
+    ListTexts texts;
+    for (const std::string &list : store().lists.current()) {
+        texts[list] = text_of_list(list);
+    }
+    return texts;
+}
+
+// Those that the tree has as they were. Without memory to compare them, fewer.
+std::set<std::string> unchanged(const ListTexts &texts)
+{
+    std::set<std::string> same;
+    try {
+        for (const auto &[list, text] : texts) {
+            if (text_of_list(list) == text) same.insert(list);
+        }
+    } catch (const std::bad_alloc &) {
+        return same;
+    }
+    return same;
+}
+
 void read_file()
 {
     Store &s = store();
+    const ListTexts before = texts_of_current_lists();
     s.forget_nodes();
     s.document.reset();
     s.unsaved = s.broken = false;
-    s.lists.tree_changed();
     const char *const why = load();
     s.state = why ? Store::State::DAMAGED : Store::State::GOOD;
     if (why) {
         complain(s.file.version, why);
         s.document.reset();
     }
+    const auto same = unchanged(before);
+    s.lists.tree_changed([&](const std::string &list) { return same.contains(list); });
 }
 
 void look_at_file()
@@ -118,14 +164,6 @@ bool takes_change(const char *path)
     look_at_file();
     const Store &s = store();
     return s.state == Store::State::GOOD && !s.broken && !s.lists.outdated(path);
-}
-
-xml_node plain_child(xml_node parent, std::string_view name)
-{
-    for (const xml_node child : parent.children()) {
-        if (child.type() == pugi::node_element && child.name() == name) return child;
-    }
-    return {};
 }
 
 // The node of a path, made when missing if `create` says so. Null when there is none.

@@ -1,7 +1,6 @@
 #include "read_lists.h"
 
 #include <algorithm>
-#include <iterator>
 
 namespace device
 {
@@ -32,10 +31,11 @@ void ReadLists::read(std::string_view path)
     if (!known && current_.size() < MOST_LISTS) current_.emplace_back(list);
 }
 
-void ReadLists::tree_changed()
+void ReadLists::tree_changed(const std::function<bool(const std::string &list)> &same)
 {
-    std::move(current_.begin(), current_.end(), std::back_inserter(outdated_));
-    current_.clear();
+    const auto others = std::stable_partition(current_.begin(), current_.end(), same);
+    outdated_.insert(outdated_.end(), others, current_.end());
+    current_.erase(others, current_.end());
 }
 
 bool ReadLists::outdated(std::string_view path) const

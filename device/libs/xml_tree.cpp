@@ -110,4 +110,11 @@ std::string text_of(const pugi::xml_document &document)
     return std::move(writer.text);
 }
 
+std::string raw_text_of(xml_node node)
+{
+    StringWriter writer;
+    node.print(writer, "", pugi::format_raw, pugi::encoding_utf8);
+    return std::move(writer.text);
+}
+
 } // namespace device

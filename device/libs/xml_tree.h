@@ -27,4 +27,7 @@ pugi::xml_node append_element(pugi::xml_node parent, const char *name);
 // The tree as a file; throws std::bad_alloc.
 std::string text_of(const pugi::xml_document &document);
 
+// One node with everything below it, to be compared; throws std::bad_alloc.
+std::string raw_text_of(pugi::xml_node node);
+
 } // namespace device

@@ -81,10 +81,11 @@ struct FolderPlace {
 };
 
 // `job` is a copy for this folder alone.
-bool run_folder(RsyncJob job, const JobName &name, const std::string &root, const FolderPlace &place)
+bool run_folder(RsyncJob job, const JobName &name, const std::optional<std::string> &root,
+                const FolderPlace &place)
 {
     copy_text(job.local_path, place.folder);
-    bool done = rsync_resolve_folder(root, place.folder) == 0;
+    bool done = root && rsync_resolve_folder(*root, place.folder) == 0;
     if (done) {
         rsync_write_progress(name, place.folder, place.index, place.count);
         done = rsync_set_ends(job, place.folder) && rsync_run_backup(name, job) == BACKUP_DONE;
@@ -95,7 +96,7 @@ bool run_folder(RsyncJob job, const JobName &name, const std::string &root, cons
 
 bool run_folders(const RsyncJob &job, const JobName &name)
 {
-    const std::string root = rsync_remote_root(name);
+    const auto root = rsync_remote_root(name);
     RsyncJob to_split = job;
     FolderTable folders{};
     rsync_split_folders(to_split, folders);

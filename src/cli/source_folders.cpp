@@ -136,13 +136,14 @@ int rsync_resolve_folder(const std::string &remote_backup_root, const std::strin
     return chdir(share_path);
 }
 
-std::string rsync_remote_root(const JobName &job)
+std::optional<std::string> rsync_remote_root(const JobName &job)
 {
     const SerialFile file = read_serial_file();
-    const std::string serial = file.text.value_or("");
     if (!file.refusal.empty()) {
-        DebugLog("ERROR: serial text of [%s] not used: %s\n", SERIAL_FILE, file.refusal.c_str());
+        DebugLog("ERROR: serial text of [%s] refused: %s\n", SERIAL_FILE, file.refusal.c_str());
+        return std::nullopt;
     }
+    const std::string serial = file.text.value_or("");
     if (serial.find_first_of("\r\n") != std::string::npos) {
         DebugLog("ERROR: line break in the serial text of [%s]: no remote folder can be named\n",
                  SERIAL_FILE);

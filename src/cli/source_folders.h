@@ -10,6 +10,7 @@
 #include "config/job.h"
 
 #include <cstddef>
+#include <optional>
 #include <string>
 
 namespace bakjob
@@ -31,8 +32,10 @@ void rsync_split_folders(RsyncJob &job, FolderTable &table);
 // cannot be entered.
 int rsync_resolve_folder(const std::string &remote_backup_root, const std::string &folder);
 
-// The folder below a job's `remote_path` in which all its data lies, "/SERIAL_remote_backup/JOB".
-std::string rsync_remote_root(const JobName &job);
+// The folder below a job's `remote_path` in which all its data lies, "/SERIAL_remote_backup/JOB". Nothing,
+// with a trace, when the serial text is refused: without it, or with a wrong one, the data would be looked
+// for elsewhere.
+std::optional<std::string> rsync_remote_root(const JobName &job);
 
 // Points the job at the two ends of the folder that was just resolved: `local_path` in a restore run at the
 // share, `remote_path` at the folder's place. False when that does not fit.

@@ -22,10 +22,29 @@ struct sigaction before[SIGNALS.size()];
 struct sigaction alarm_before;
 sigset_t mask_before;
 
+extern "C" void note(int number);
+
+// Waits are to be broken off, so without SA_RESTART.
+struct sigaction noting()
+{
+    struct sigaction action = {};
+    action.sa_handler = note;
+    sigfillset(&action.sa_mask);
+    return action;
+}
+
+// Not before it is needed: an alarm that our caller has set is not ours.
+void start_alarm()
+{
+    const struct sigaction action = noting();
+    sigaction(SIGALRM, &action, nullptr);
+    alarm(1);
+}
+
 extern "C" void note(int number)
 {
     if (number != SIGALRM && noted == 0) noted = number;
-    alarm(1);
+    if (noted != 0 || waits_end != 0) start_alarm();
 }
 
 std::time_t monotonic_seconds()
@@ -41,14 +60,16 @@ CatchInterrupts::CatchInterrupts()
 {
     noted = 0;
     waits_end = 0;
-    struct sigaction action = {};
-    action.sa_handler = note; // without SA_RESTART: waits are to be broken off
-    sigfillset(&action.sa_mask);
-    sigaction(SIGALRM, &action, &alarm_before);
-    sigset_t unblocked;
-    sigemptyset(&unblocked);
-    sigaddset(&unblocked, SIGALRM);
-    sigprocmask(SIG_UNBLOCK, &unblocked, &mask_before);
+    const struct sigaction action = noting();
+    sigaction(SIGALRM, nullptr, &alarm_before);
+    sigprocmask(SIG_SETMASK, nullptr, &mask_before);
+    if (sigismember(&mask_before, SIGALRM) == 1) {
+        sigaction(SIGALRM, &action, nullptr);
+        sigset_t unblocked;
+        sigemptyset(&unblocked);
+        sigaddset(&unblocked, SIGALRM);
+        sigprocmask(SIG_UNBLOCK, &unblocked, nullptr);
+    }
     for (std::size_t i = 0; i < SIGNALS.size(); ++i) {
         sigaction(SIGNALS[i], nullptr, &before[i]);
         if (before[i].sa_handler != SIG_IGN) sigaction(SIGNALS[i], &action, nullptr);
@@ -62,7 +83,7 @@ CatchInterrupts::~CatchInterrupts()
     for (std::size_t i = 0; i < SIGNALS.size(); ++i) {
         sigaction(SIGNALS[i], &before[i], nullptr);
     }
-    alarm(0);
+    if (noted != 0 || waits_end != 0) alarm(0);
     sigaction(SIGALRM, &alarm_before, nullptr);
     sigprocmask(SIG_SETMASK, &mask_before, nullptr);
     if (noted == 0) return;
@@ -89,7 +110,7 @@ void throw_if_interrupted()
 void limit_waits(int seconds)
 {
     waits_end = monotonic_seconds() + seconds;
-    alarm(1);
+    start_alarm();
 }
 
 } // namespace bakjob

@@ -27,7 +27,7 @@ constexpr const char *JOB_COUNT = "/backup_mgr/rsync/count";
 constexpr int LONGEST_GAP = 1000; // items that are not there, one behind the other
 
 constexpr const char *UNREADABLE = "the configuration cannot be read";
-constexpr const char *WRONG_COUNT = "/backup_mgr/rsync/count is missing or smaller than the number of items";
+constexpr const char *WRONG_COUNT = "/backup_mgr/rsync/count is missing or below 1, but there are items";
 constexpr const char *GAP = "/backup_mgr/rsync/count is much larger than the number of items";
 constexpr const char *NO_MEMORY = "there is not enough memory";
 constexpr const char *LONG_TEXT = "a text of a job is longer than 1 MiB";
@@ -51,12 +51,12 @@ private:
     int key_;
 };
 
-// What the store answers for an item: negative when there is none. Paths with a number are read from the tree
-// that the count came from, so that one which could not be read does not seem whole by being read again.
-int look_for_item(int item)
+// Paths with a number are read from the tree that the count came from, so that one which could not be read
+// does not seem whole by being read again.
+bool is_unreadable(int item)
 {
     char start[2] = "";
-    return xml_get_str(format_text("%s/item:%d", JOBS, item).c_str(), sizeof start, start);
+    return xml_get_str(format_text("%s/item:%d", JOBS, item).c_str(), sizeof start, start) == XML_UNREADABLE;
 }
 
 const char *text_to_save(const RsyncJob &job, const JobField &field)
@@ -123,9 +123,9 @@ public:
             }
         }
         if (missing_ >= LONGEST_GAP) return GAP;
-        const int behind = look_for_item(item);
-        if (behind == XML_UNREADABLE) return UNREADABLE;
-        return behind >= 0 ? WRONG_COUNT : failure_;
+        if (is_unreadable(item)) return UNREADABLE;
+        // A count that is too low counts all the same: an earlier, longer list may have left what is behind.
+        return count < 1 && store_has(format_text("%s/item:1", JOBS)) ? WRONG_COUNT : failure_;
     }
 
 private:
@@ -160,7 +160,7 @@ bool save_job(const RsyncJob &job, int item)
         const char *const key = path.key(field.key);
         const int answer = field.size == 0 ? xml_set_int(key, integer_field(job, field))
                                            : xml_set_str(key, text_to_save(job, field));
-        set &= answer >= 0;
+        set &= answer != XML_UNREADABLE;
     }
     return set;
 }
@@ -169,7 +169,7 @@ bool save_job(const RsyncJob &job, int item)
 bool save_list()
 {
     bool set = xml_del(JOBS) != XML_UNREADABLE;
-    if (rsync_job_list_empty() == 0) set &= xml_set_int(JOB_COUNT, job_list->count) >= 0;
+    if (rsync_job_list_empty() == 0) set &= xml_set_int(JOB_COUNT, job_list->count) != XML_UNREADABLE;
     int item = 0;
     for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
         set &= save_job(*job, ++item);

@@ -118,12 +118,6 @@ void delete_entry(int entry, int entries_left)
     store_decimal(ENTRY_COUNT, entries_left);
 }
 
-bool has_node(const std::string &path)
-{
-    char start[2] = "";
-    return xml_get_str(path.c_str(), sizeof start, start) >= 0;
-}
-
 bool list_group(int number)
 {
     return set_store_text(group_name_path(number), GROUP) && store_decimal(GROUP_COUNT, number);
@@ -254,8 +248,8 @@ bool rsync_add_schedule(const ScheduleEntry &entry)
     const int entries = std::max(xml_get_int(ENTRY_COUNT), 0);
     const std::string path = entry_path(entries + 1);
     if (std::max(groups, entries) >= MOST_ENTRIES) return false;
-    if (has_node(path)) return false;
-    if (group.name_path.empty() && has_node(group_name_path(groups + 1))) return false;
+    if (store_has(path)) return false;
+    if (group.name_path.empty() && store_has(group_name_path(groups + 1))) return false;
     const bool added = write_entry(path, entry) && (!group.name_path.empty() || list_group(groups + 1)) &&
                        store_decimal(ENTRY_COUNT, entries + 1);
     if (!added) xml_del(path.c_str());

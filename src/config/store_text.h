@@ -19,6 +19,15 @@ inline std::string store_text(const std::string &path, std::size_t size)
     return text;
 }
 
+// Whether there is a node at `path`: only then is the buffer written to.
+inline bool store_has(const std::string &path)
+{
+    constexpr char UNTOUCHED = '\1';
+    char start[2] = {UNTOUCHED, '\0'};
+    xml_get_str(path.c_str(), sizeof start, start);
+    return start[0] != UNTOUCHED;
+}
+
 // Bytes, and one for its end, of the longest text that is read whole.
 inline constexpr std::size_t LONGEST_TEXT = 1U << 20U;
 

@@ -18,8 +18,8 @@ int xml_get_str(const char *path, int size, char *buffer);
 // The integer at `path`, or -1 when there is none.
 int xml_get_int(const char *path);
 
-// Create or overwrite the value at `path`, with every node above it. Negative on failure: then xml_write_file
-// fails, too, and all changes since the last write are dropped.
+// Create or overwrite the value at `path`, with every node above it. XML_UNREADABLE when that fails: then
+// xml_write_file fails, too, and all changes since the last write are dropped.
 int xml_set_str(const char *path, const char *text);
 int xml_set_int(const char *path, int value);
 
