@@ -1,6 +1,7 @@
 // check: what would make a run fail, found before it runs.
 
 #include "commands.h"
+#include "common/job_files.h"
 #include "failure.h"
 #include "findings.h"
 #include "jobs.h"
@@ -9,7 +10,9 @@
 #include <algorithm>
 #include <array>
 #include <cstdio>
+#include <map>
 #include <nlohmann/json.hpp>
+#include <string_view>
 
 namespace bakjob::ctl
 {
@@ -24,14 +27,23 @@ const char *verdict_of(const Finding &finding)
     return VERDICTS.at(static_cast<std::size_t>(finding.verdict));
 }
 
-// Advice speaks of the job NAME.
-std::string with_name(std::string text, const std::string &name)
+// Advice speaks of the job NAME and its PIDFILE. What is put in their places is not looked at again.
+std::string with_name(std::string_view advice, const std::string &name)
 {
-    constexpr std::string_view PLACE = "NAME";
-    const std::size_t place = text.find(PLACE);
-    const bool option = name.starts_with('-') && text.starts_with("bakjobctl");
-    const std::string word = (option ? "-- " : "") + name_for_shell(name);
-    return place == std::string::npos ? text : text.replace(place, PLACE.size(), word);
+    const bool option = name.starts_with('-') && advice.starts_with("bakjobctl");
+    const auto job = JobName::checked(name);
+    const std::map<std::string_view, std::string> words = {
+        {"NAME", (option ? "-- " : "") + name_for_shell(name)},
+        {"PIDFILE", job ? name_for_shell(pid_file(*job)) : ""},
+    };
+    std::string text;
+    while (!advice.empty()) {
+        const auto word = std::find_if(words.begin(), words.end(),
+                                       [&](const auto &one) { return advice.starts_with(one.first); });
+        text += word == words.end() ? std::string(advice.substr(0, 1)) : word->second;
+        advice.remove_prefix(word == words.end() ? 1 : word->first.size());
+    }
+    return text;
 }
 
 void print_findings(const Findings &findings)

@@ -2,6 +2,7 @@
 #include "cli/source_folders.h"
 #include "common/job_files.h"
 #include "common/password.h"
+#include "common/private_file.h"
 #include "common/shell_text.h"
 #include "common/text.h"
 #include "config/current_job.h"
@@ -17,7 +18,9 @@
 #include <array>
 #include <cerrno>
 #include <cstring>
+#include <filesystem>
 #include <optional>
+#include <system_error>
 #include <unistd.h>
 
 namespace bakjob::ctl
@@ -46,6 +49,7 @@ public:
     void taken_over(const std::vector<ScheduleEntry> &entries);
     void configuration();
     void runs();
+    void own_files();
     void snapshots();
     void programs();
     void serial();
@@ -190,7 +194,7 @@ void Check::runs()
     if (run == Run::GOING_ON) note("run", "one is going on now", "bakjobctl watch NAME follows it.");
     if (run == Run::LEFT_BEHIND) {
         problem("run", "one died and left " + pid_file(*name_) + ", so every other is refused",
-                "rm " + pid_file(*name_) + " and bakjob -a clear that.");
+                "rm PIDFILE && bakjob -k NAME ends what it has left, too.");
     }
     if (run == Run::NONE && rsync_state_is_running(job_.state) == 1) {
         note("state", "it says that a run is going on, but there is none", "bakjob -a clears that.");
@@ -199,6 +203,18 @@ void Check::runs()
         problem(
             "schedule_mode", "the job runs once, and has run",
             "bakjob -b -r NAME runs it again; schedule_mode=timetable lets it run as often as it is told.");
+    }
+}
+
+// A folder with something in it is not removed, and the file is not made.
+void Check::own_files()
+{
+    if (!name_) return;
+    for (const std::string &path : {password_file(*name_), remote_config_copy(*name_)}) {
+        std::error_code ignored;
+        if (!is_directory(path) || std::filesystem::is_empty(path, ignored)) continue;
+        problem(path, "it is a folder, and a run has to make a file there",
+                "Find out who made it, and take it away.");
     }
 }
 
@@ -286,6 +302,10 @@ void Check::folder(const std::string &root, const std::string &folder)
     share_of(root, folder);
     if (findings_.size() == before && access(folder.c_str(), F_OK) != 0) missing_folder(folder);
     if (findings_.size() != before) return;
+    if (job_.backup_type != BACKUP_PUSH && access(folder.c_str(), W_OK) != 0) {
+        problem(folder, std::string("nothing can be written there: ") + std::strerror(errno),
+                "Make it writable.");
+    }
     RsyncJob ended = job_;
     const bool fits = copy_text(ended.local_path, folder) && rsync_set_ends(ended, folder);
     rsync_prepare_current_job(ended);
@@ -306,6 +326,7 @@ void check_here(const RsyncJob &job, const std::vector<ScheduleEntry> &schedule,
     check.schedule(schedule);
     check.configuration();
     check.runs();
+    check.own_files();
     check.snapshots();
     check.programs();
     check.serial();

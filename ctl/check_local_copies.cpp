@@ -17,8 +17,6 @@ namespace bakjob::ctl
 namespace
 {
 
-constexpr int MOST_SNAPSHOTS = 10;
-
 void check_link(const RsyncJob &job, const std::string &folder, Findings &findings)
 {
     if (why_no_folder(folder) != "is a link") return;

@@ -94,7 +94,8 @@ std::vector<std::string> folders_of(const RsyncJob &job)
 
 std::string name_for_shell(const std::string &name)
 {
-    const bool plain = shell_word(name) == name && name.find_first_of("!~") == std::string::npos;
+    const bool plain =
+        !name.empty() && shell_word(name) == name && name.find_first_of("!~") == std::string::npos;
     return plain ? name : in_single_quotes(name);
 }
 

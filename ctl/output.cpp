@@ -58,7 +58,7 @@ void print_table(const Row &header, const std::vector<Row> &rows)
 
 void print_json(const Json &value, int indent)
 {
-    std::puts(value.dump(indent, ' ', false, Json::error_handler_t::replace).c_str());
+    std::puts(value.dump(indent, ' ', true, Json::error_handler_t::replace).c_str());
     std::fflush(stdout);
 }
 

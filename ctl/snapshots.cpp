@@ -1,17 +1,21 @@
 // snapshots: those of a job, as a recover run numbers them.
 
-#include "cli/recover_list.h"
 #include "commands.h"
 #include "common/job_files.h"
+#include "common/private_file.h"
 #include "failure.h"
 #include "jobs.h"
 #include "output.h"
 #include "transfer/snapshot_mark.h"
 
+#include <array>
 #include <cstdio>
 #include <cstring>
+#include <ctime>
 #include <nlohmann/json.hpp>
-#include <optional>
+#include <string>
+#include <sys/stat.h>
+#include <vector>
 
 namespace bakjob::ctl
 {
@@ -30,37 +34,37 @@ void require_snapshots(const RsyncJob &job)
     }
 }
 
-// The number that -n takes for the snapshot; nothing for a folder that only looks like one.
-std::optional<int> recover_number(const RecoverEntry &entry)
+std::string time_of(const std::string &path)
 {
-    const std::string path = entry.path;
-    for (int number = 0; number < RecoverList::SIZE; ++number) {
-        if (path.ends_with('/' + snapshot_name(recover_list.job_name, number))) return number + 1;
-    }
-    return std::nullopt;
+    struct stat status = {};
+    std::array<char, 32> time{};
+    std::tm local{};
+    if (stat(path.c_str(), &status) != 0 || localtime_r(&status.st_mtime, &local) == nullptr) return "";
+    std::strftime(time.data(), time.size(), "%Y-%m-%d %H:%M:%S", &local);
+    return time.data();
 }
 
 } // namespace
 
 int show_snapshots(const Request &request)
 {
-    require_snapshots(read_job(request.name).record);
-    const int found = rsync_list_snapshots(request.name);
+    const RsyncJob job = read_job(request.name).record;
+    require_snapshots(job);
     std::vector<Row> rows;
     Json list = Json::array();
-    for (int i = 0; found != 0 && i < recover_list.count; ++i) {
-        const RecoverEntry &entry = recover_list.entries[i];
-        const auto number = recover_number(entry);
-        if (!number) continue;
+    // By their names: bakjob's own listing takes whatever begins so, and no more than ten.
+    for (int number = 1; number <= MOST_SNAPSHOTS; ++number) {
+        const std::string path = snapshot_path(job.local_path, job.job_name, number - 1);
+        if (!is_directory(path)) continue;
         // What a part of the files lacks, a recover run deletes at the remote side.
-        const bool complete = is_marked_whole(entry.path);
+        const bool complete = is_marked_whole(path);
+        const std::string time = time_of(path);
         const std::string command =
-            complete ? "bakjob -n " + std::to_string(*number) + " -r " + name_for_shell(request.name) : "";
-        rows.push_back(
-            {std::to_string(*number), entry.time, complete ? "yes" : "not known", entry.path, command});
-        list.push_back({{"number", *number},
-                        {"time", entry.time},
-                        {"path", entry.path},
+            complete ? "bakjob -n " + std::to_string(number) + " -r " + name_for_shell(request.name) : "";
+        rows.push_back({std::to_string(number), time, complete ? "yes" : "not known", path, command});
+        list.push_back({{"number", number},
+                        {"time", time},
+                        {"path", path},
                         {"complete", complete},
                         {"recover", complete ? Json(command) : Json()}});
     }

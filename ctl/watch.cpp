@@ -150,9 +150,8 @@ public:
         // A line when the folder changes or its transfer begins, and now and then between.
         const std::string step = progress.place + (progress.moved ? "t" : "l");
         const bool due = Clock::now() >= next_;
-        const std::string line = json_
-                                     ? json_of(progress).dump(-1, ' ', false, Json::error_handler_t::replace)
-                                     : words_of(progress);
+        const std::string line = json_ ? json_of(progress).dump(-1, ' ', true, Json::error_handler_t::replace)
+                                       : words_of(progress);
         if (step == step_ && (!due || line == line_)) return;
         step_ = step;
         line_ = line;

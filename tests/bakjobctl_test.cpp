@@ -182,7 +182,10 @@ TEST_F(Ctl, ACheckFindsWhatARunWouldMeetHere)
         {{{"schedule_mode", "2"}, {"state", "2"}}, "", 1, "the job runs once, and has run"},
         {{{"state", "3"}}, "", 0, "bakjob -a clears that"},
         {{{"inc_enable", "1"}}, "", 0, "only a job that pulls keeps snapshots"},
-        {{}, "true & echo $! >/var/run/bakjob_daily.pid", 1, "rm /var/run/bakjob_daily.pid and bakjob -a"},
+        {{},
+         "true & echo $! >/var/run/bakjob_daily.pid",
+         1,
+         "rm /var/run/bakjob_daily.pid && bakjob -k daily"},
         {{}, "echo $PPID >/var/run/bakjob_daily.pid", 1, "run: one died"}, // another process has the number
         {{}, "printf 'S\\n1' >/tmp/kv_serial.txt", 1, "line break"},
         {{}, "chmod o+w /tmp/kv_serial.txt", 1, "problem  /tmp/kv_serial.txt: it is not a plain file"},

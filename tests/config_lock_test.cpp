@@ -73,17 +73,6 @@ std::vector<std::string> moved_aside()
     return found;
 }
 
-// Whether the process waits for the lock on what is at `path` now.
-bool waits(pid_t process, const std::string &path)
-{
-    const std::string who = " " + std::to_string(process) + " ";
-    const std::string where = ":" + std::to_string(inode(path)) + " ";
-    for (const std::string &line : lines_of(read_file("/proc/locks"))) {
-        if (contains(line, "-> FLOCK") && contains(line, who) && contains(line, where)) return true;
-    }
-    return false;
-}
-
 void until_told_to_go()
 {
     eventually([] { return exists("/tmp/go"); }, 60);
@@ -214,7 +203,7 @@ TEST_F(ConfigLock, OneThatOthersCouldOpenIsMendedAndHonoured)
     const Child holder(holding([] { return as_older_programs_do(LOCK); }));
     ASSERT_TRUE(eventually([] { return exists("/tmp/held"); }));
     const Child waiter(take_it);
-    ASSERT_TRUE(eventually([&] { return waits(waiter.pid(), LOCK); }));
+    ASSERT_TRUE(eventually([&] { return has_open(waiter.pid(), LOCK); }));
     EXPECT_TRUE(is_lock(LOCK));
     EXPECT_NE(shell(as_neighbour("flock --nonblock " + LOCK + " true") + " 2>/dev/null").status, 0);
     write_file("/tmp/go", "");
@@ -228,17 +217,35 @@ TEST_F(ConfigLock, OneThatIsReplacedInAWaitIsWaitedForAnew)
     const Child holder(holding([] { return rsync_lock_config(LOCK.c_str()); }));
     ASSERT_TRUE(eventually([] { return exists("/tmp/held"); }));
     const Child waiter(take_it);
-    ASSERT_TRUE(eventually([&] { return waits(waiter.pid(), LOCK); }));
+    ASSERT_TRUE(eventually([&] { return has_open(waiter.pid(), LOCK); }));
     fs::rename(LOCK, "/tmp/replaced");
     UniqueFd newer = rsync_lock_config(LOCK.c_str());
     write_file("/tmp/go", "");
-    EXPECT_TRUE(eventually([&] { return waits(waiter.pid(), LOCK); }));
+    EXPECT_TRUE(eventually([&] { return has_open(waiter.pid(), LOCK); }));
     EXPECT_FALSE(exists("/tmp/got"));
     newer.reset();
     ASSERT_TRUE(eventually(got_it));
 }
 
 // Where the kernel lets a neighbour give another name to a file that he cannot open.
+// He opened the file while everybody could, and the process that locked it has ended.
+TEST_F(ConfigLock, ANeighbourWhoGotHoldOfAnOldLockIsPassedBy)
+{
+    write_file(LOCK, "");
+    fs::permissions(LOCK, fs::perms(0644));
+    shell("setpriv --reuid 65534 --regid 65534 --clear-groups "
+          "sh -c 'exec 9<" +
+          LOCK +
+          "; flock -x 9; exec sleep 60' >/dev/null 2>&1 & "
+          "until ! flock -n " +
+          LOCK + " true; do sleep 0.01; done");
+    const UniqueFd lock = rsync_lock_config(LOCK.c_str());
+    EXPECT_TRUE(lock);
+    EXPECT_EQ(octal_mode(LOCK), "600");
+    EXPECT_NE(shell("flock -n " + LOCK + " true").status, 0) << "it is the one at the path";
+    shell("pkill -u 65534 sleep");
+}
+
 TEST_F(ConfigLock, AnHonestHolderOfOneWithTwoNamesIsWaitedFor)
 {
     const Child holder(holding([] { return rsync_lock_config(LOCK.c_str()); }));
@@ -318,7 +325,7 @@ TEST_F(ConfigLock, ADiscoveryLooksAloneAtItsCopy)
     const Child other(holding([] { return rsync_lock_config(DISCOVERY_LOCK_FILE); }));
     ASSERT_TRUE(eventually([] { return exists("/tmp/held"); }));
     const Child discovery(rsync_discover_remote);
-    EXPECT_TRUE(eventually([&] { return waits(discovery.pid(), DISCOVERY_LOCK_FILE); }));
+    EXPECT_TRUE(eventually([&] { return has_open(discovery.pid(), DISCOVERY_LOCK_FILE); }));
     EXPECT_FALSE(exists("/tmp/calls"));
     write_file("/tmp/go", "");
     EXPECT_TRUE(eventually([] { return exists("/tmp/calls"); }));

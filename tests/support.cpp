@@ -11,6 +11,7 @@
 #include <sstream>
 #include <sys/stat.h>
 #include <sys/wait.h>
+#include <system_error>
 #include <thread>
 #include <unistd.h>
 
@@ -72,6 +73,15 @@ bool eventually(const std::function<bool()> &condition, int seconds)
         std::this_thread::sleep_for(std::chrono::milliseconds(10));
     }
     return true;
+}
+
+bool has_open(pid_t process, const std::string &path)
+{
+    std::error_code none;
+    for (const auto &handle : fs::directory_iterator("/proc/" + std::to_string(process) + "/fd", none)) {
+        if (fs::equivalent(handle.path(), path, none)) return true;
+    }
+    return false;
 }
 
 void Appliance::SetUp()

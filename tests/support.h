@@ -10,6 +10,7 @@
 #include <gtest/gtest.h>
 #include <map>
 #include <string>
+#include <sys/types.h>
 #include <vector>
 
 using Keys = std::map<std::string, std::string>;
@@ -31,6 +32,9 @@ int in_child(const std::function<int()> &body);
 
 // Waits until the condition holds; false after `seconds`.
 bool eventually(const std::function<bool()> &condition, int seconds = 10);
+
+// Whether a process has what is at `path` now open: as it does while it waits for a lock on it.
+bool has_open(pid_t process, const std::string &path);
 
 // Clears what earlier tests left: store, shares, alerts, files of jobs, trace.
 class Appliance : public testing::Test

@@ -75,6 +75,15 @@ TEST_F(WholeList, ACountThatCannotBeRightStopsEverySave)
     }
     put_damaged("<count>3</count>", "<count>2147483647</count>");
     expect_refused("count is much larger than the number of items");
+    put_damaged("<rsync>", "<rsync><count>1</count><item><job_name>one</job_name></item></rsync><rsync>");
+    expect_refused("there are two lists of jobs");
+    const std::string start(127, 'x');
+    put_damaged("<job_name>two</job_name>", "<job_name>" + start + "photos</job_name>");
+    std::string both = read_file(STORE);
+    const std::string three = "<job_name>three</job_name>";
+    write_file(STORE,
+               both.replace(both.find(three), three.size(), "<job_name>" + start + "music</job_name>"));
+    expect_refused("the names of two jobs begin with the same 127 bytes");
 
     write_file(STORE, good_);
     EXPECT_TRUE(says(ctl("set one retry=1"), 0, ""));
@@ -107,9 +116,13 @@ TEST_F(WholeList, AMissingFileIsNotAnEmptyOneWhileFlashHasItsCopy)
     expect_refused("a link to a file that is not there");
     EXPECT_FALSE(exists("/etc/NAS_CFG/gone"));
 
-    // Without a copy that could be lost, an appliance begins with nothing.
+    // A copy that cannot be read may be mended.
     fs::remove(STORE);
-    write_file(FLASH, "<config><half");
+    write_file(FLASH, good_.substr(0, good_.size() - 20));
+    expect_refused("move the copy away to begin anew");
+
+    // Without one, an appliance begins with nothing.
+    fs::remove(FLASH);
     EXPECT_TRUE(says(add("new"), 0, ""));
     EXPECT_TRUE(says(ctl("list --names"), 0, "new\n"));
 }
@@ -124,6 +137,10 @@ TEST_F(WholeList, WhatBringsTheProgramDownIsRefused)
     }
     write_file(STORE, deep + good_.substr(good_.find("<config>") + 8));
     expect_refused("its elements are nested too deep");
+    write_file(STORE, "<!DOCTYPE config [<!ENTITY nas \"NAS\">]>" + good_.substr(good_.find("<config>")));
+    expect_refused("it declares entities");
+    write_file(STORE, good_ + std::string(1, '\0') + "<more/>");
+    expect_refused("it holds a NUL byte");
 
     put_damaged("<user_description></user_description>",
                 "<user_description>" + std::string(1 << 20, 'x') + "</user_description>");

@@ -47,10 +47,12 @@ const char *copy_or_say_why()
 
 } // namespace
 
-bool device::flash_has_good_copy()
+FlashCopy device::flash_copy()
 {
+    struct stat status = {};
+    if (lstat(FLASH_FILE, &status) < 0 && errno == ENOENT) return FlashCopy::NONE;
     std::string contents;
-    return read_configuration(FLASH_FILE, contents) == nullptr;
+    return read_configuration(FLASH_FILE, contents) == nullptr ? FlashCopy::GOOD : FlashCopy::UNREADABLE;
 }
 
 int LIB_CP_Config_To_MTD(int how)

@@ -32,9 +32,18 @@ const char *reason_of_missing_file()
 {
     struct stat status = {};
     if (lstat(STORE_FILE, &status) == 0) return "it is a link to a file that is not there";
-    if (!flash_has_good_copy()) return nullptr;
-    return "it is missing, but its copy in flash is there; "
-           "cp -p /var/lib/device_flash/config.xml /etc/NAS_CFG/config.xml brings it back";
+    switch (flash_copy()) {
+    case FlashCopy::NONE:
+        return nullptr;
+    case FlashCopy::GOOD:
+        return "it is missing, but its copy in flash is there; "
+               "cp -p /var/lib/device_flash/config.xml /etc/NAS_CFG/config.xml brings it back";
+    case FlashCopy::UNREADABLE:
+        break;
+    }
+    return "it is missing, and its copy in flash, /var/lib/device_flash/config.xml, cannot be read; nothing "
+           "is "
+           "written over either. Mend one, or move the copy away to begin anew";
 }
 
 // The file behind the store's name, which may be a link, and what is kept of it: never more than the owner

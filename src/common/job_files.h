@@ -35,6 +35,8 @@ std::string remote_config_copy(const JobName &job);
 inline constexpr const char *DISCOVERY_CONFIG_COPY = "/tmp/remote_rinfo.txt";
 inline constexpr const char *DISCOVERY_LOCK_FILE = "/tmp/remote_rinfo.lock";
 
+inline constexpr int MOST_SNAPSHOTS = 10; // of a job; a recover run names one of so many
+
 // Name of a snapshot folder inside the job's local folder: the job's name (or "backup") and the number, 0 the
 // newest, with a full stop between them.
 std::string snapshot_name(std::string_view job_name, std::int64_t number);

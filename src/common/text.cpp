@@ -42,9 +42,12 @@ Character first_character(std::string_view text)
 
 bool is_unshown(char32_t code)
 {
-    const auto within = [&](char32_t first, char32_t last) { return code >= first && code <= last; };
-    return code < 0x20 || within(0x7F, 0x9F) || within(0x200E, 0x200F) || within(0x2028, 0x202E) ||
-           within(0x2066, 0x2069);
+    // Control characters, and those that take no room or turn the direction of the text.
+    constexpr char32_t RANGES[][2] = {{0, 0x1F},        {0x7F, 0x9F},      {0xAD, 0xAD},     {0x61C, 0x61C},
+                                      {0x200B, 0x200F}, {0x2028, 0x202E},  {0x2060, 0x206F}, {0xFEFF, 0xFEFF},
+                                      {0xFFF9, 0xFFFB}, {0xE0000, 0xE007F}};
+    return std::any_of(std::begin(RANGES), std::end(RANGES),
+                       [&](const auto &range) { return code >= range[0] && code <= range[1]; });
 }
 
 } // namespace

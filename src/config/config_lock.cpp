@@ -15,6 +15,7 @@
 #include <sys/stat.h>
 #include <thread>
 #include <unistd.h>
+#include <utility>
 
 namespace bakjob
 {
@@ -53,18 +54,25 @@ bool flock_within(milliseconds &patience, int file)
     return true;
 }
 
-bool wait_for_flock(const char *path, int file)
+enum class Wait { TAKEN, NEIGHBOUR, FAILED };
+
+// Until the lock is taken, or turns out to be held by another user, who could open the file before it got its
+// mode. He may hold it for ever.
+Wait wait_for_flock(const char *path, int file)
 {
-    if (tell_of_wait != nullptr) {
-        milliseconds untold = UNTOLD_WAIT;
-        if (flock_within(untold, file)) return true;
-        tell_of_wait(path, flock_holder(file));
-    }
-    while (flock(file, LOCK_EX) != 0) {
-        if (errno != EINTR) return false;
+    bool told = false;
+    for (milliseconds waited(0); flock(file, LOCK_EX | LOCK_NB) != 0; waited += BETWEEN_LOOKS) {
+        if (errno != EWOULDBLOCK && errno != EINTR) return Wait::FAILED;
         throw_if_interrupted();
+        if (waited > milliseconds(0) && waited % UNTOLD_WAIT == milliseconds(0)) {
+            const auto holder = flock_holder(file);
+            if (holder && holder->neighbour) return Wait::NEIGHBOUR;
+            if (!told && tell_of_wait != nullptr) tell_of_wait(path, holder);
+            told = true;
+        }
+        std::this_thread::sleep_for(BETWEEN_LOOKS);
     }
-    return true;
+    return Wait::TAKEN;
 }
 
 UniqueFd open_lock(const char *path)
@@ -83,7 +91,7 @@ UniqueFd take_guard(bool make)
 {
     UniqueFd guard = make ? create_file(LOCK_GUARD_FILE, LOCK_MODE) : UniqueFd();
     if (!guard && (!make || errno == EEXIST)) guard = open_own_file(LOCK_GUARD_FILE, O_RDONLY);
-    if (guard && !wait_for_flock(LOCK_GUARD_FILE, guard.get())) guard.reset();
+    if (guard && wait_for_flock(LOCK_GUARD_FILE, guard.get()) != Wait::TAKEN) guard.reset();
     return guard;
 }
 
@@ -108,16 +116,18 @@ bool move_aside(const char *path)
 
 // The file that is made is a lock for the one who made it, even if somebody gives it another name at once:
 // whoever moves it aside for that waits for the lock first.
-UniqueFd make_lock(const char *path, milliseconds &patience)
+// A lock that a neighbour holds, if one is given, is in the way, too.
+UniqueFd make_lock(const char *path, milliseconds &patience, const UniqueFd &neighbours)
 {
     struct stat there = {};
-    const bool in_the_way = lstat(path, &there) == 0 && !is_lock(there);
+    const auto is_fine = [&] { return is_lock(there) && !(neighbours && is_at(path, neighbours.get())); };
+    const bool in_the_way = lstat(path, &there) == 0 && !is_fine();
     const UniqueFd guard = take_guard(in_the_way);
     UniqueFd linked;
     if (lstat(path, &there) == 0) {
-        if (is_lock(there)) return open_lock(path); // made by another meanwhile
+        if (is_fine()) return open_lock(path); // made by another meanwhile
         if (!guard) return UniqueFd();
-        if (is_own_file(there)) linked = wait_for_linked(path, patience);
+        if (is_own_file(there) && !is_lock(there)) linked = wait_for_linked(path, patience);
         if (!move_aside(path)) return UniqueFd();
     }
     return create_file(path, LOCK_MODE);
@@ -126,11 +136,18 @@ UniqueFd make_lock(const char *path, milliseconds &patience)
 UniqueFd take_lock(const char *path)
 {
     milliseconds patience = LINKED_WAIT;
+    UniqueFd neighbours;
     for (int tries = 0; tries < MOST_TRIES; ++tries) {
-        UniqueFd lock = open_lock(path);
-        if (!lock) lock = make_lock(path, patience);
+        UniqueFd lock = neighbours ? UniqueFd() : open_lock(path);
+        if (!lock) lock = make_lock(path, patience, neighbours);
+        neighbours.reset();
         if (!lock) continue;
-        if (!wait_for_flock(path, lock.get())) return UniqueFd();
+        const Wait wait = wait_for_flock(path, lock.get());
+        if (wait == Wait::FAILED) return UniqueFd();
+        if (wait == Wait::NEIGHBOUR) {
+            neighbours = std::move(lock);
+            continue;
+        }
         // Somebody may have replaced the file while we waited: then the lock is on the new one.
         if (is_at(path, lock.get())) return lock;
         errno = EBUSY;

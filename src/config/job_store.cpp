@@ -29,6 +29,8 @@ constexpr int LONGEST_GAP = 1000; // items that are not there, one behind the ot
 constexpr const char *UNREADABLE = "the configuration cannot be read";
 constexpr const char *WRONG_COUNT = "/backup_mgr/rsync/count is missing or below 1, but there are items";
 constexpr const char *GAP = "/backup_mgr/rsync/count is much larger than the number of items";
+constexpr const char *TWO_LISTS = "there are two lists of jobs, /backup_mgr/rsync";
+constexpr const char *SAME_NAME = "the names of two jobs begin with the same 127 bytes";
 constexpr const char *NO_MEMORY = "there is not enough memory";
 constexpr const char *LONG_TEXT = "a text of a job is longer than 1 MiB";
 
@@ -124,6 +126,7 @@ public:
         }
         if (missing_ >= LONGEST_GAP) return GAP;
         if (is_unreadable(item)) return UNREADABLE;
+        if (store_has(format_text("%s:2", JOBS))) return TWO_LISTS;
         // A count that is too low counts all the same: an earlier, longer list may have left what is behind.
         return count < 1 && store_has(format_text("%s/item:1", JOBS)) ? WRONG_COUNT : failure_;
     }
@@ -133,7 +136,10 @@ private:
     {
         auto job = std::make_unique<RsyncJob>();
         missing_ = load_job(*job, item) ? 0 : missing_ + 1;
-        if (!names_.insert(job->job_name).second) return;
+        if (!names_.insert(job->job_name).second) {
+            if (was_cut(*job, "job_name")) failure_ = SAME_NAME;
+            return;
+        }
         if (has_endless_text(*job)) failure_ = LONG_TEXT;
         rsync_list_take_job(std::move(job));
     }
