@@ -11,8 +11,8 @@ namespace device
 // The whole text at `path`, however long; none when there is no such node.
 std::optional<std::string> store_text(const std::string &path);
 
-// Whether flash holds a configuration that could take the file's place. One that cannot be read may still be all
-// that is left.
+// Whether flash holds a configuration that could take the file's place. One that cannot be read may still be
+// all that is left.
 enum class FlashCopy { NONE, GOOD, UNREADABLE };
 FlashCopy flash_copy();
 

@@ -76,7 +76,7 @@ std::optional<LockHolder> flock_holder(int file)
     std::optional<LockHolder> holder;
     std::error_code none;
     for (const auto &entry : fs::directory_iterator("/proc", none)) {
-        const pid_t process = std::atoi(entry.path().filename().c_str());
+        const auto process = static_cast<pid_t>(std::strtol(entry.path().filename().c_str(), nullptr, 10));
         if (process <= 0 || !has_locked(entry.path(), place)) continue;
         const bool neighbour = stat(entry.path().c_str(), &status) != 0 || status.st_uid != geteuid();
         if (!holder || !neighbour) holder = LockHolder{process, program_of(process), neighbour};
