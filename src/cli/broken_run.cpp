@@ -2,12 +2,10 @@
 
 #include "cli/job_state.h"
 #include "cli/run_processes.h"
-#include "cli/source_folders.h"
 #include "common/debug_log.h"
 #include "common/interrupt.h"
 #include "common/job_files.h"
 
-#include <exception>
 #include <unistd.h>
 
 namespace bakjob
@@ -24,25 +22,37 @@ void attempt(const Step &step)
 {
     try {
         step();
-    } catch (const std::exception &why) {
-        DebugLog("ERROR: the run's end: %s\n", why.what());
+    } catch (...) { // without memory there is nothing to say it with
     }
 }
 
 } // namespace
 
-void rsync_end_broken_run(const JobName &job, const PidFile &pid_file) noexcept
+std::vector<std::string> rsync_files_of_run(const JobName &job)
 {
-    if (noted_interrupt() != 0) DebugLog("ERROR: interrupted by signal %d\n", noted_interrupt());
-    attempt([] { RunProcesses(getpid(), true).end(GRACE); });
+    return {password_file(job), remote_config_copy(job), progress_file(job)};
+}
+
+void rsync_end_broken_run(const JobName &job, const PidFile &pid_file,
+                          const std::vector<std::string> &files) noexcept
+{
+    attempt([] {
+        if (noted_interrupt() != 0) DebugLog("ERROR: interrupted by signal %d\n", noted_interrupt());
+    });
+    bool ended = false;
+    attempt([&] {
+        RunProcesses(getpid(), true).end(GRACE);
+        ended = true;
+    });
     attempt([&] {
         limit_waits(LOCK_WAIT);
         rsync_record_interruption(job.text());
     });
-    attempt([&] { unlink(password_file(job).c_str()); });
-    attempt([&] { unlink(remote_config_copy(job).c_str()); });
-    attempt([&] { rsync_remove_progress(job); });
-    rsync_remove_pid_file(pid_file);
+    for (const std::string &file : files) {
+        unlink(file.c_str());
+    }
+    // What may still be going on is not to meet another run.
+    if (ended) rsync_remove_pid_file(pid_file);
 }
 
 } // namespace bakjob

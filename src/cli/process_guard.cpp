@@ -8,6 +8,7 @@
 #include "common/shell_text.h"
 #include "common/text.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <charconv>
 #include <fcntl.h>
@@ -30,11 +31,13 @@ constexpr mode_t PID_FILE_MODE = 0644;
 pid_t process_id_in(int file)
 {
     char text[32] = "";
-    if (pread(file, text, sizeof text - 1, 0) <= 0) return 0;
-    const std::string_view content(text);
+    const ssize_t length = pread(file, text, sizeof text, 0);
+    if (length <= 0 || length == sizeof text) return 0;
+    const std::string_view content(text, static_cast<std::size_t>(length));
     pid_t pid = 0;
     const auto [end, error] = std::from_chars(content.data(), content.data() + content.size(), pid);
-    const bool whole = error == std::errc() && (*end == '\0' || std::string_view(end) == "\n");
+    const std::string_view rest = content.substr(static_cast<std::size_t>(end - content.data()));
+    const bool whole = error == std::errc() && (rest.empty() || rest == "\n");
     return whole && pid > 0 ? pid : 0;
 }
 
@@ -66,7 +69,10 @@ bool runs_job(pid_t pid, std::string_view job_name)
     bool is_named = false;
     for (std::string word; std::getline(file, word, '\0');) {
         is_bakjob |= std::string_view(word).substr(word.rfind('/') + 1) == "bakjob";
-        is_named |= word.ends_with(job_name);
+        const std::string_view option =
+            std::string_view(word).substr(0, word.size() - std::min(word.size(), job_name.size()));
+        const bool joined = option.starts_with('-') && option.ends_with('r');
+        is_named |= word.ends_with(job_name) && (option.empty() || joined);
     }
     return is_bakjob && is_named;
 }
@@ -129,7 +135,8 @@ int rsync_kill_job_process(const JobName &job)
 {
     if (rsync_pid_file_absent(job)) return -1;
     const std::string path = pid_file(job);
-    if (rsync_read_pid_file(job).process == 0) {
+    const pid_t process = rsync_read_pid_file(job).process;
+    if (process == 0 || process == getpid()) {
         DebugLog("ERROR: no process id in [%s]\n", path.c_str());
         return -1;
     }

@@ -21,6 +21,8 @@
 #include <cstdio>
 #include <cstring>
 #include <optional>
+#include <system_error>
+#include <vector>
 
 namespace bakjob
 {
@@ -157,6 +159,7 @@ bool rsync_run_job(const std::string &job_name, bool force, bool &outcome)
     if (!is_due(*job, force)) return false;
     if (is_restore_run()) job->backup_type = BACKUP_PULL;
 
+    const std::vector<std::string> files = rsync_files_of_run(*name);
     const CatchInterrupts interrupts;
     const PidFile pid_file = take_pid_file(*name);
     if (!pid_file.handle) return false;
@@ -165,10 +168,10 @@ bool rsync_run_job(const std::string &job_name, bool force, bool &outcome)
         if (!run_folders(*job, *name)) outcome = false;
         rsync_set_job_state(job_name, final_state(*job, outcome));
     } catch (const Interrupted &) {
-        rsync_end_broken_run(*name, pid_file);
+        rsync_end_broken_run(*name, pid_file, files);
         return false; // to whoever handles the signal; by default, nobody is left
     } catch (...) {
-        rsync_end_broken_run(*name, pid_file);
+        rsync_end_broken_run(*name, pid_file, files);
         throw;
     }
     rsync_remove_pid_file(pid_file);
@@ -184,7 +187,11 @@ void rsync_kill_job(const std::string &job_name)
     }
     const PidFile file = rsync_read_pid_file(*name);
     std::optional<RunProcesses> started;
-    if (file.process > 0) started.emplace(file.process, file.is_run);
+    try {
+        if (file.process > 0) started.emplace(file.process, file.is_run);
+    } catch (const std::system_error &why) {
+        DebugLog("ERROR: what the run has started: %s\n", why.what());
+    }
     if (rsync_kill_job_process(*name) == 0) std::puts("kill rsync job success .....");
     rsync_kill_transfers(*name);
     if (started) started->end(0);

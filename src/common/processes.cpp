@@ -1,6 +1,7 @@
 #include "common/processes.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <charconv>
 #include <cstdio>
 #include <cstring>
@@ -10,6 +11,7 @@
 #include <optional>
 #include <string>
 #include <sys/stat.h>
+#include <system_error>
 
 namespace bakjob
 {
@@ -69,8 +71,9 @@ bool sees_our_ids(pid_t process)
 std::vector<Process> running_processes()
 {
     const std::unique_ptr<DIR, CloseFolder> folder(opendir("/proc"));
+    if (!folder) throw std::system_error(errno, std::generic_category(), "/proc");
     std::vector<Process> all;
-    while (const dirent *const entry = folder ? readdir(folder.get()) : nullptr) {
+    while (const dirent *const entry = readdir(folder.get())) {
         pid_t id = 0;
         const char *const end = entry->d_name + std::strlen(entry->d_name);
         if (std::from_chars(entry->d_name, end, id).ptr != end) continue;
