@@ -98,7 +98,8 @@ xml_node plain_child(xml_node parent, std::string_view name)
 std::string text_of_list(const std::string &list)
 {
     xml_node node = store().document.document_element();
-    for (const Step &step : parse_store_path(list).used()) {
+    const StorePath path = parse_store_path(list);
+    for (const Step &step : path.used()) {
         node = plain_child(node, step.name);
     }
     return raw_text_of(node);
