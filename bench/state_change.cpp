@@ -10,9 +10,9 @@
 
 #include "atomic_file.h"
 #include "bare_store.h"
-#include "cli/job_state.h"
 #include "common/job_files.h"
 #include "config/job_operations.h"
+#include "config/job_state.h"
 
 #include <chrono>
 #include <climits>

@@ -1,9 +1,12 @@
 // bakjobctl: backup jobs for people. The words of the command line, and which function they mean.
 
-#include "commands.h"
+#include "check/commands.h"
 #include "common/process_start.h"
 #include "config/config_lock.h"
-#include "failure.h"
+#include "jobs/commands.h"
+#include "output/failure.h"
+#include "recover/commands.h"
+#include "runs/commands.h"
 
 #include <CLI/CLI.hpp>
 #include <array>

@@ -3,7 +3,7 @@
 #include "common/text.h"
 #include "fuzz.h"
 #include "remote/reply.h"
-#include "remote/ssh_test.h"
+#include "remote/ssh_probe.h"
 
 #include <algorithm>
 

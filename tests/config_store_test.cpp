@@ -16,6 +16,8 @@
 #include <utility>
 #include <vector>
 
+using namespace bakjob;
+
 namespace
 {
 
@@ -321,7 +323,7 @@ TEST_F(ConfigStore, TheShareTableKeepsItsPromisedLayout)
         return pointer;
     };
     ASSERT_EQ(get_samba_info(), 0);
-    EXPECT_EQ(pointer_at(pss, 49016), nullptr);
+    EXPECT_EQ(pointer_at(pss, SHARE_TABLE_FIRST), nullptr);
 
     xml_set_str("/system_mgr/samba/share/item:1/name", "Public");
     xml_set_str("/system_mgr/samba/share/item:1/path", "/mnt/HD/HD_a2/Public");
@@ -331,14 +333,14 @@ TEST_F(ConfigStore, TheShareTableKeepsItsPromisedLayout)
     xml_set_str("/system_mgr/samba/share/item:3/path", "/mnt/HD/HD_a2/my share");
     xml_set_int("/system_mgr/samba/share/count", 3);
     ASSERT_EQ(get_samba_info(), 0);
-    const char *first = pointer_at(pss, 49016);
+    const char *first = pointer_at(pss, SHARE_TABLE_FIRST);
     ASSERT_NE(first, nullptr);
-    EXPECT_STREQ(first + 516, "Public");
-    EXPECT_STREQ(first + 2052, "/mnt/HD/HD_a2/Public");
-    const char *second = pointer_at(first, 55348);
+    EXPECT_STREQ(first + SHARE_NAME, "Public");
+    EXPECT_STREQ(first + SHARE_PATH, "/mnt/HD/HD_a2/Public");
+    const char *second = pointer_at(first, SHARE_NEXT);
     ASSERT_NE(second, nullptr);
-    EXPECT_STREQ(second + 516, " my share");
-    EXPECT_EQ(pointer_at(second, 55348), nullptr);
+    EXPECT_STREQ(second + SHARE_NAME, " my share");
+    EXPECT_EQ(pointer_at(second, SHARE_NEXT), nullptr);
     Free_All_List();
     EXPECT_EQ(pss, nullptr);
 }

@@ -1,8 +1,8 @@
-#include "cli/job_state.h"
-#include "cli/process_guard.h"
 #include "cli/recover_list.h"
 #include "common/run_options.h"
 #include "config/job_list.h"
+#include "config/job_state.h"
+#include "config/process_guard.h"
 #include "support.h"
 
 #include <cerrno>

@@ -1,6 +1,6 @@
 // What reaches people's terminals.
 
-#include "output.h"
+#include "output/output.h"
 
 #include <gtest/gtest.h>
 #include <map>

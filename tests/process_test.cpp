@@ -1,11 +1,11 @@
 // Runs that are killed or interrupted, and the bound on probes: nothing goes on behind a run, nothing stands
 // in the way of the next one.
 
-#include "cli/job_state.h"
-#include "cli/process_guard.h"
-#include "cli/unrecorded_state.h"
 #include "common/shell.h"
 #include "config/config_lock.h"
+#include "config/job_state.h"
+#include "config/process_guard.h"
+#include "config/unrecorded_state.h"
 #include "process_support.h"
 
 #include <csignal>

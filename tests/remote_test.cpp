@@ -3,11 +3,11 @@
 #include "common/text.h"
 #include "config/current_job.h"
 #include "remote/daemon_config.h"
-#include "remote/daemon_test.h"
+#include "remote/daemon_probe.h"
 #include "remote/discovery.h"
 #include "remote/remote_dir.h"
 #include "remote/ssh_login.h"
-#include "remote/ssh_test.h"
+#include "remote/ssh_probe.h"
 #include "support.h"
 
 #include <csignal>

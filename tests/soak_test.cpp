@@ -1,11 +1,11 @@
 // What must hold however often it is tried: hostile values, kills in mid-save, races for one job, kills of
 // runs, files placed beforehand, remote sides that misbehave.
 
-#include "cli/job_state.h"
 #include "common/debug_log.h"
 #include "common/run_options.h"
 #include "config/current_job.h"
 #include "config/job_list.h"
+#include "config/job_state.h"
 #include "config/job_store.h"
 #include "platform/config_store.h"
 #include "remote/discovery.h"

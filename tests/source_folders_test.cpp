@@ -1,5 +1,7 @@
 #include "cli/source_folders.h"
 #include "common/run_options.h"
+#include "common/text.h"
+#include "config/current_job.h"
 #include "support.h"
 
 #include <cstring>

@@ -1,8 +1,8 @@
 // A configuration that cannot be written, and a run that must say so elsewhere.
 
-#include "cli/job_state.h"
-#include "cli/unrecorded_state.h"
 #include "common/run_options.h"
+#include "config/job_state.h"
+#include "config/unrecorded_state.h"
 #include "ctl_support.h"
 
 #include <filesystem>

@@ -12,6 +12,10 @@
 #include <string>
 #include <vector>
 
+using bakjob::SHARE_NAME;
+using bakjob::SHARE_NEXT;
+using bakjob::SHARE_PATH;
+using bakjob::SHARE_TABLE_FIRST;
 using device::store_text;
 
 char *pss = nullptr;
@@ -19,10 +23,6 @@ char *pss = nullptr;
 namespace
 {
 
-constexpr std::size_t BLOCK_FIRST = 49016; // pointer to the first record
-constexpr std::size_t RECORD_NAME = 516;
-constexpr std::size_t RECORD_PATH = 2052;
-constexpr std::size_t RECORD_NEXT = 55348; // pointer to the next record, null in the last
 constexpr std::size_t LONGEST_TEXT = 1024;
 
 using Bytes = std::vector<char>;
@@ -36,7 +36,6 @@ std::vector<Bytes> &table()
     return the_table;
 }
 
-// RECORD_NEXT is not aligned for pointers of 8 bytes.
 void put_pointer(Bytes &bytes, std::size_t offset, const char *pointer)
 {
     std::memcpy(bytes.data() + offset, &pointer, sizeof pointer);
@@ -54,22 +53,22 @@ std::optional<Bytes> read_share(int number)
     const auto name = store_text(item + "/name");
     const auto path = store_text(item + "/path");
     if (!name || !path || name->size() > LONGEST_TEXT || path->size() > LONGEST_TEXT) return std::nullopt;
-    Bytes record(RECORD_NEXT + sizeof(char *), '\0');
-    put_text(record, RECORD_NAME, *name);
-    put_text(record, RECORD_PATH, *path);
+    Bytes record(SHARE_NEXT + sizeof(char *), '\0');
+    put_text(record, SHARE_NAME, *name);
+    put_text(record, SHARE_PATH, *path);
     return record;
 }
 
 void load_table()
 {
     std::vector<Bytes> loaded;
-    loaded.emplace_back(BLOCK_FIRST + sizeof(char *), '\0');
+    loaded.emplace_back(SHARE_TABLE_FIRST + sizeof(char *), '\0');
     const int count = xml_get_int((SHARES + "/count").c_str());
     for (int number = 1; number <= count; ++number) {
         if (auto record = read_share(number)) loaded.push_back(std::move(*record));
     }
     for (std::size_t i = 1; i < loaded.size(); ++i) {
-        put_pointer(loaded[i - 1], i == 1 ? BLOCK_FIRST : RECORD_NEXT, loaded[i].data());
+        put_pointer(loaded[i - 1], i == 1 ? SHARE_TABLE_FIRST : SHARE_NEXT, loaded[i].data());
     }
     table() = std::move(loaded);
     pss = table().front().data();

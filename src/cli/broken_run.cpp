@@ -1,10 +1,10 @@
 #include "cli/broken_run.h"
 
-#include "cli/job_state.h"
 #include "cli/run_processes.h"
 #include "common/debug_log.h"
 #include "common/interrupt.h"
 #include "common/job_files.h"
+#include "config/job_state.h"
 
 #include <unistd.h>
 

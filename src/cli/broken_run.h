@@ -2,8 +2,8 @@
 
 // The end of a run that a signal, or a failure such as a lack of memory, breaks off.
 
-#include "cli/process_guard.h"
 #include "common/job_name.h"
+#include "config/process_guard.h"
 
 #include <string>
 #include <vector>

@@ -1,10 +1,10 @@
 #include "cli/options.h"
 
-#include "cli/job_state.h"
 #include "cli/run_job.h"
 #include "common/debug_log.h"
 #include "common/password.h"
 #include "common/run_options.h"
+#include "config/job_state.h"
 
 #include <array>
 #include <cstdio>

@@ -1,8 +1,6 @@
 #include "cli/run_job.h"
 
 #include "cli/broken_run.h"
-#include "cli/job_state.h"
-#include "cli/process_guard.h"
 #include "cli/recover_list.h"
 #include "cli/run_processes.h"
 #include "cli/source_folders.h"
@@ -11,7 +9,9 @@
 #include "common/job_files.h"
 #include "common/run_options.h"
 #include "config/job_list.h"
+#include "config/job_state.h"
 #include "config/job_store.h"
+#include "config/process_guard.h"
 #include "platform/config_store.h"
 #include "platform/device.h"
 #include "transfer/backup.h"

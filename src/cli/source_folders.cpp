@@ -5,6 +5,7 @@
 #include "common/job_files.h"
 #include "common/private_file.h"
 #include "common/run_options.h"
+#include "config/current_job.h"
 #include "platform/device.h"
 
 #include <array>
@@ -20,19 +21,8 @@
 namespace bakjob
 {
 
-char share_remote_dir[PATH_SIZE];
-char share_path[PATH_SIZE];
-char share_subdir[PATH_SIZE];
-
 namespace
 {
-
-// Byte offsets that the share library promises, whatever the width of a pointer: the next record's is not
-// aligned for one of 8 bytes.
-constexpr std::size_t FIRST_SHARE = 49016;
-constexpr std::size_t SHARE_NAME = 516;
-constexpr std::size_t SHARE_PATH = 2052;
-constexpr std::size_t NEXT_SHARE = 55348;
 
 const char *pointer_at(const char *block, std::size_t offset)
 {
@@ -52,11 +42,11 @@ public:
     // The first share that holds the folder, or null.
     [[nodiscard]] const char *holding(const std::string &folder) const
     {
-        const char *share = pss == nullptr ? nullptr : pointer_at(pss, FIRST_SHARE);
+        const char *share = pss == nullptr ? nullptr : pointer_at(pss, SHARE_TABLE_FIRST);
         while (share != nullptr) {
             const std::string path = share + SHARE_PATH;
             if (folder == path || folder.starts_with(path + '/')) break;
-            share = pointer_at(share, NEXT_SHARE);
+            share = pointer_at(share, SHARE_NEXT);
         }
         return share;
     }

@@ -6,7 +6,6 @@
 
 #include "common/folder_table.h"
 #include "common/job_name.h"
-#include "common/text.h"
 #include "config/job.h"
 
 #include <cstddef>
@@ -16,18 +15,13 @@
 namespace bakjob
 {
 
-// Filled by rsync_resolve_folder.
-extern char share_remote_dir[PATH_SIZE]; // the backup root and the share's name
-extern char share_path[PATH_SIZE];       // the share's folder on this device
-extern char share_subdir[PATH_SIZE];     // the folder's place below the share: "/" for the share itself
-
 inline constexpr std::size_t SERIAL_SIZE = 128;
 
 // Splits the job's `local_path` into the table, in place. Folders that the table cannot hold, and a last one
 // that the store had to cut, are counted as left out.
 void rsync_split_folders(RsyncJob &job, FolderTable &table);
 
-// Finds the first share that holds the folder, fills the three buffers and changes the working directory to
+// Finds the first share that holds the folder, fills the share buffers and changes the working directory to
 // the share's path. -1 when no share holds it, it has a ".." step, a text does not fit, or the share's path
 // cannot be entered.
 int rsync_resolve_folder(const std::string &remote_backup_root, const std::string &folder);

@@ -8,6 +8,10 @@ namespace bakjob
 
 RsyncJob CurrentJob{};
 
+char share_remote_dir[PATH_SIZE];
+char share_path[PATH_SIZE];
+char share_subdir[PATH_SIZE];
+
 void rsync_prepare_current_job(RsyncJob &job)
 {
     const auto name = JobName::checked(job.job_name);

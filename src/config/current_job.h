@@ -1,7 +1,8 @@
 #pragma once
 
-// The job of the folder being transferred, with its defaults filled in: what the remote probes read.
+// The folder being transferred: its job, with its defaults filled in, and its place in a network share.
 
+#include "common/text.h"
 #include "config/job.h"
 
 namespace bakjob
@@ -12,5 +13,10 @@ extern RsyncJob CurrentJob;
 // Fills CurrentJob from the caller's job. Of the defaults, only that of `rsync_pwd_file` is written back into
 // the caller's job; a job without a proper name has none.
 void rsync_prepare_current_job(RsyncJob &job);
+
+// Filled when the folder is resolved.
+extern char share_remote_dir[PATH_SIZE]; // the backup root and the share's name
+extern char share_path[PATH_SIZE];       // the share's folder on this device
+extern char share_subdir[PATH_SIZE];     // the folder's place below the share: "/" for the share itself
 
 } // namespace bakjob

@@ -8,7 +8,7 @@
 #include "config/current_job.h"
 #include "config/remote_modules.h"
 #include "remote/daemon_config.h"
-#include "remote/daemon_test.h"
+#include "remote/daemon_probe.h"
 #include "remote/sizes.h"
 #include "remote/ssh_login.h"
 

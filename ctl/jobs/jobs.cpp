@@ -1,0 +1,102 @@
+#include "jobs/jobs.h"
+
+#include "cli/source_folders.h"
+#include "common/folder_table.h"
+#include "common/job_files.h"
+#include "common/shell_text.h"
+#include "config/config_lock.h"
+#include "config/job_list.h"
+#include "config/job_operations.h"
+#include "config/job_store.h"
+#include "output/failure.h"
+#include "platform/device.h"
+
+#include <cerrno>
+#include <cstring>
+
+namespace bakjob::ctl
+{
+
+namespace
+{
+
+[[noreturn]] void no_such_job(const std::string &name)
+{
+    throw Failure("there is no job \"" + name + "\"; bakjobctl list shows those that there are");
+}
+
+} // namespace
+
+void load_jobs()
+{
+    if (!rsync_load_jobs()) throw Failure(std::string("not all jobs can be read: ") + rsync_load_failure());
+}
+
+std::vector<StoredJob> read_jobs()
+{
+    const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
+    load_jobs();
+    std::vector<StoredJob> jobs;
+    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+        rsync_copy_job(jobs.emplace_back().record, *job);
+        jobs.back().schedule = rsync_job_schedule(job->job_name);
+    }
+    rsync_free_jobs();
+    return jobs;
+}
+
+StoredJob read_job(const std::string &name)
+{
+    for (StoredJob &job : read_jobs()) {
+        if (name == job.record.job_name) return std::move(job);
+    }
+    no_such_job(name);
+}
+
+void change_jobs(const std::function<void()> &change)
+{
+    const auto changing = [&] {
+        change();
+        return true;
+    };
+    const JobChange changed = rsync_change_jobs(changing, WithoutLock::REFUSE);
+    if (changed == JobChange::NOT_LOCKED) {
+        throw Failure(std::string(CONFIG_LOCK_FILE) + " cannot be locked: " + std::strerror(errno) +
+                      "; nothing is changed");
+    }
+    if (changed == JobChange::NOT_LOADED) {
+        throw Failure(std::string("nothing is changed, as not all jobs can be read: ") +
+                      rsync_load_failure());
+    }
+    if (changed != JobChange::SAVED) throw Failure("the configuration could not be written");
+    const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
+    if (!lock || LIB_CP_Config_To_MTD(1) < 0) {
+        throw Failure("the configuration is changed, but could not be copied to flash");
+    }
+}
+
+void change_job(const std::string &name, const std::function<void(RsyncJob &)> &change)
+{
+    change_jobs([&] {
+        RsyncJob *const job = rsync_find_job(name);
+        if (job == nullptr) no_such_job(name);
+        change(*job);
+    });
+}
+
+std::vector<std::string> folders_of(const RsyncJob &job)
+{
+    RsyncJob to_split = job;
+    FolderTable folders{};
+    rsync_split_folders(to_split, folders);
+    return {folders.entries, folders.entries + folders.count};
+}
+
+std::string name_for_shell(const std::string &name)
+{
+    const bool plain =
+        !name.empty() && shell_word(name) == name && name.find_first_of("!~") == std::string::npos;
+    return plain ? name : in_single_quotes(name);
+}
+
+} // namespace bakjob::ctl

@@ -1,0 +1,155 @@
+#include "config/job_state.h"
+
+#include "common/debug_log.h"
+#include "common/interrupt.h"
+#include "common/job_files.h"
+#include "common/run_options.h"
+#include "common/text.h"
+#include "config/config_lock.h"
+#include "config/job_list.h"
+#include "config/job_store.h"
+#include "config/process_guard.h"
+#include "config/unrecorded_state.h"
+#include "platform/device.h"
+
+#include <cerrno>
+#include <cstring>
+#include <ctime>
+#include <exception>
+#include <utility>
+#include <vector>
+
+namespace bakjob
+{
+
+namespace
+{
+
+bool saving = false; // and still true behind a save that threw
+
+// Whether the configuration has taken the states. One that could not be loaded whole may be damaged, and the
+// copy in flash may not be.
+bool save_and_commit()
+{
+    saving = true;
+    const bool saved = rsync_save_jobs();
+    saving = false;
+    if (rsync_load_failure() == nullptr) LIB_CP_Config_To_MTD(1);
+    return saved;
+}
+
+// A state that is lost would leave the one before it to be believed.
+void keep_unrecorded(const std::string &job_name, StateKind kind, const UnrecordedState &state)
+{
+    DebugLog("ERROR: state %d of [%s] is not recorded: the configuration could not be written\n", state.state,
+             job_name.c_str());
+    const auto name = JobName::checked(job_name);
+    if (!name || rsync_keep_unrecorded(*name, kind, state)) return;
+    DebugLog("ERROR: [%s]: %s\n", unrecorded_file(*name).c_str(), std::strerror(errno));
+}
+
+void forget_unrecorded(const std::string &job_name, StateKind kind)
+{
+    if (const auto name = JobName::checked(job_name)) rsync_forget_unrecorded(*name, kind);
+}
+
+StateKind kind_of_run()
+{
+    return run_options.restore_mode != 0 ? StateKind::RESTORE : StateKind::BACKUP;
+}
+
+void set_state(RsyncJob &job, StateKind kind, JobState state, const char *now)
+{
+    (kind == StateKind::RESTORE ? job.rstate : job.state) = state;
+    copy_text(kind == StateKind::RESTORE ? job.rlast_do_job_time : job.last_do_job_time, now);
+}
+
+bool reset_if_stale(std::int32_t &state, char (&time)[JOB_TIME_SIZE], const char *now)
+{
+    if (rsync_state_is_running(state) == 0) return false;
+    state = JOB_INTERRUPTED;
+    copy_text(time, now);
+    return true;
+}
+
+} // namespace
+
+void rsync_job_time(char (&text)[JOB_TIME_SIZE])
+{
+    const std::time_t now = std::time(nullptr);
+    std::tm local{};
+    localtime_r(&now, &local);
+    std::strftime(text, sizeof text, "%a %b %d %Y %I:%M:%S %p", &local);
+}
+
+int rsync_state_is_running(std::int32_t state)
+{
+    return state == JOB_RUNNING || state == JOB_RECOVER_RUNNING || state == JOB_STARTING ? 1 : 0;
+}
+
+void rsync_set_job_state(const std::string &job_name, JobState state)
+{
+    const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
+    const bool loaded = rsync_load_jobs();
+    RsyncJob *const job = rsync_find_job(job_name);
+    if (job == nullptr && loaded) {
+        rsync_free_jobs();
+        return;
+    }
+    const StateKind kind = kind_of_run();
+    char now[JOB_TIME_SIZE] = "";
+    rsync_job_time(now);
+    const UnrecordedState as_set{state, now};
+    if (job != nullptr) set_state(*job, kind, state, now);
+    if (save_and_commit()) {
+        forget_unrecorded(job_name, kind);
+    } else {
+        keep_unrecorded(job_name, kind, as_set);
+    }
+}
+
+void rsync_record_interruption(const std::string &job_name)
+{
+    if (!saving) {
+        try {
+            rsync_free_jobs();
+            rsync_set_job_state(job_name, JOB_INTERRUPTED);
+            return;
+        } catch (const std::exception &) { // somebody holds the lock, or there is no memory
+        }
+    }
+    char now[JOB_TIME_SIZE] = "";
+    rsync_job_time(now);
+    keep_unrecorded(job_name, kind_of_run(), {JOB_INTERRUPTED, now});
+}
+
+void rsync_reset_stale_states()
+{
+    const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
+    rsync_load_jobs();
+    char now[JOB_TIME_SIZE] = "";
+    rsync_job_time(now);
+    std::vector<std::pair<std::string, StateKind>> changed;
+    for (RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+        // A name that no run can have has no pid file either.
+        const auto name = JobName::checked(job->job_name);
+        if (name && !rsync_pid_file_absent(*name)) continue;
+        if (reset_if_stale(job->state, job->last_do_job_time, now)) {
+            changed.emplace_back(job->job_name, StateKind::BACKUP);
+        }
+        if (reset_if_stale(job->rstate, job->rlast_do_job_time, now)) {
+            changed.emplace_back(job->job_name, StateKind::RESTORE);
+        }
+    }
+    if (changed.empty()) {
+        rsync_free_jobs();
+    } else if (save_and_commit()) {
+        for (const auto &[job_name, kind] : changed) {
+            forget_unrecorded(job_name, kind);
+        }
+    } else {
+        DebugLog("ERROR: stale states are not reset: the configuration could not be written\n");
+    }
+}
+
+} // namespace bakjob
