@@ -51,7 +51,7 @@ void add_path(std::set<std::string> &paths, const std::string &line)
 
 void check_commands(const std::string &path)
 {
-    if (is_plain_for_shells("path", path))
+    if (!refusal_for_shells("path", path))
         must(is_word(path, path), "a plain path is what it is to any shell");
     const auto escaped = shell_path("path", path);
     if (!escaped) return;

@@ -73,14 +73,14 @@ void check_escape_in_place(const std::string &text)
 
 void check_plain(const std::string &text)
 {
-    const bool plain = is_safe_host(text) || is_safe_rsync_user(text) || is_safe_ssh_user(text);
+    const bool plain = !refusal_of_host(text) || !refusal_of_rsync_user(text) || !refusal_of_ssh_user(text);
     must(!plain || text.empty() || is_word("x" + text, "x" + text), "a name that passes is plain");
     must(!plain || !text.starts_with('-'), "a name is no option");
-    if (is_safe_port(text)) {
+    if (!refusal_of_port(text)) {
         const std::string port = text.substr(0, text.find_last_not_of(' ') + 1);
         must(is_word("x" + text, "x" + port), "a port that passes is plain");
     }
-    if (is_base64("password", text)) must(is_word("x" + text, "x" + text), "base64 text is plain");
+    if (!refusal_of_base64("password", text)) must(is_word("x" + text, "x" + text), "base64 text is plain");
 }
 
 } // namespace

@@ -178,7 +178,7 @@ TEST_F(Ctl, ACheckFindsWhatARunWouldMeetHere)
         {{{"local_path", "/mnt/HD/HD_a2/None"}}, "", 1, "/mnt/HD/HD_a2/None: no share holds it"},
         {{{"local_path", long_folder}}, "", 1, "problem  local_path"},
         {{{"local_path", "/mnt/HD/HD_a2/Public"}}, "rm -r /mnt/HD/HD_a2/Public", 1, "cannot be entered"},
-        {{{"remote_path", std::string(1000, 'x')}}, "", 1, "its transfer's command is refused"},
+        {{{"remote_path", std::string(1000, 'x')}}, "", 1, "remote_path refused: too long"},
         {{{"schedule_mode", "2"}, {"state", "2"}}, "", 1, "the job runs once, and has run"},
         {{{"state", "3"}}, "", 0, "bakjob -a clears that"},
         {{{"inc_enable", "1"}}, "", 0, "only a job that pulls keeps snapshots"},

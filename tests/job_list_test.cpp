@@ -157,7 +157,7 @@ TEST_F(JobList, LoadingBringsNumbersIntoRange)
     rsync_load_jobs();
     EXPECT_EQ(std::string(job_list->head->local_path), std::string(2599, 'x'));
     EXPECT_TRUE(was_cut(*job_list->head, "local_path"));
-    EXPECT_TRUE(has_whole_texts(*job_list->head)) << "its other folders can be transferred";
+    EXPECT_FALSE(refusal_of_cut_text(*job_list->head)) << "its other folders can be transferred";
     EXPECT_STREQ(job_list->tail->job_name, "") << "counted, but not there";
     EXPECT_EQ(job_list->tail->retry_interval, 30);
     store_set("/backup_mgr/rsync/count", "2147483647");
@@ -168,7 +168,7 @@ TEST_F(JobList, LoadingBringsNumbersIntoRange)
     add_job({{"local_path", std::string(2599, 'x')}, {"port", std::string(16, '8')}});
     rsync_load_jobs();
     EXPECT_FALSE(was_cut(*job_list->head, "local_path"));
-    EXPECT_FALSE(has_whole_texts(*job_list->head)) << "the port";
+    EXPECT_TRUE(refusal_of_cut_text(*job_list->head)) << "the port";
     for (int save = 0; save < 2; ++save) {
         rsync_load_jobs();
         rsync_save_jobs();

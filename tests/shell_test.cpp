@@ -127,23 +127,23 @@ TEST_F(Shell, WhatCannotBeQuotedIsRefused)
 
     for (const std::string host :
          {"-oProxyCommand=x", "a b", "a;b", "$(x)", "`x`", "a'b", "a\nb", "a/b", "a@b", "[::1]"}) {
-        EXPECT_FALSE(is_safe_host(host)) << host;
+        EXPECT_TRUE(refusal_of_host(host)) << host;
     }
     for (const std::string host : {"10.0.0.1", "nas-2.example", "fe80::1", "fe80::1%eth0"}) {
-        EXPECT_TRUE(is_safe_host(host)) << host;
+        EXPECT_FALSE(refusal_of_host(host)) << host;
     }
     for (const std::string user : {"-l", "a b", "a:b", "a/b", "a&b", "a\"b"}) {
-        EXPECT_FALSE(is_safe_rsync_user(user)) << user;
+        EXPECT_TRUE(refusal_of_rsync_user(user)) << user;
     }
-    EXPECT_TRUE(is_safe_rsync_user("bk@example.org"));
-    EXPECT_TRUE(is_safe_ssh_user("CORP/jd"));
-    EXPECT_FALSE(is_safe_ssh_user("ssh://x"));
+    EXPECT_FALSE(refusal_of_rsync_user("bk@example.org"));
+    EXPECT_FALSE(refusal_of_ssh_user("CORP/jd"));
+    EXPECT_TRUE(refusal_of_ssh_user("ssh://x"));
     EXPECT_EQ(shell_path_part("x", "-rf"), "-rf");
-    EXPECT_TRUE(is_safe_port("873  "));
-    EXPECT_FALSE(is_safe_port("8 73"));
-    EXPECT_FALSE(is_safe_port("873;x"));
-    EXPECT_TRUE(is_base64("x", "cGFrdG8="));
-    EXPECT_FALSE(is_base64("x", "a'b"));
+    EXPECT_FALSE(refusal_of_port("873  "));
+    EXPECT_TRUE(refusal_of_port("8 73"));
+    EXPECT_TRUE(refusal_of_port("873;x"));
+    EXPECT_FALSE(refusal_of_base64("x", "cGFrdG8="));
+    EXPECT_TRUE(refusal_of_base64("x", "a'b"));
 }
 
 // A path that the shell of the remote host reads as it is: also a C shell, which people over there may have.
@@ -151,7 +151,7 @@ TEST_F(Shell, APathIsRefusedOnlyForWhatAShellActsOnWhereItStands)
 {
     for (const std::string path :
          {"/v/#recycle", "/v/C#", "/v/a~b", "/v/wow!", "a+b", "100%", "a=b", "x^y", "/v/caf\xc3\xa9"}) {
-        EXPECT_TRUE(is_plain_for_shells("x", path)) << path;
+        EXPECT_FALSE(refusal_for_shells("x", path)) << path;
         for (const char *program : {"sh", "bash", "csh"}) {
             if (shell(std::string("command -v ") + program).status != 0) continue;
             const std::string command = "printf '[%s]' " + path + " 2>&1";
@@ -162,6 +162,6 @@ TEST_F(Shell, APathIsRefusedOnlyForWhatAShellActsOnWhereItStands)
     }
     for (const std::string path : {"#recycle", "~root", "=ls", "^a", "%1", "a!b", "a=~root", "a:~root", "-rf",
                                    "a b", "a$b", "a;b", "a(b", "a'b", "a\nb", "a{b,c}", "a[b]", ""}) {
-        EXPECT_EQ(is_plain_for_shells("x", path), path.empty()) << path;
+        EXPECT_EQ(!refusal_for_shells("x", path), path.empty()) << path;
     }
 }

@@ -13,7 +13,7 @@
 #include "jobs/scheduler_file.h"
 #include "jobs/summary.h"
 #include "output/failure.h"
-#include "transfer/backup.h"
+#include "transfer/plan.h"
 
 #include <array>
 #include <cerrno>
@@ -276,7 +276,7 @@ void Check::folders()
 
 void Check::share_of(const std::string &root, const std::string &folder)
 {
-    if (rsync_resolve_folder(root, folder) == 0) return;
+    if (!enter_share(root, folder)) return;
     if (*share_path == '\0') {
         problem(folder, "no share holds it", "local_path names folders of the appliance's shares.");
     } else {
@@ -307,13 +307,9 @@ void Check::folder(const std::string &root, const std::string &folder)
                 "Make it writable.");
     }
     RsyncJob ended = job_;
-    const bool fits = copy_text(ended.local_path, folder) && rsync_set_ends(ended, folder);
-    rsync_prepare_current_job(ended);
-    if (!fits || !rsync_transfer_command(ended)) {
-        problem(folder, "its transfer's command is refused",
-                "remote_path and the folder are too long together, or hold what no command can; "
-                "bakjob -d -r NAME says which.");
-    }
+    Refusal refusal = set_ends(ended, folder);
+    if (!refusal) refusal = plan_transfer(ended, rsync_with_defaults(ended)).command.refusal();
+    if (refusal) problem(folder, refusal.why, "A run cannot transfer it. Set what is refused anew.");
 }
 
 } // namespace

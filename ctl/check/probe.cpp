@@ -3,9 +3,7 @@
 #include "common/shell.h"
 #include "common/shell_text.h"
 #include "common/text.h"
-#include "config/current_job.h"
 #include "remote/daemon_probe.h"
-#include "transfer/backup.h"
 
 #include <algorithm>
 #include <array>
@@ -64,18 +62,19 @@ struct Ended {
     int code; // 0: well
 };
 
-Ended failed(const char *why)
+Ended failed(const std::string &why)
 {
     Ended ended{{}, -1};
     ended.reply.take(why);
     return ended;
 }
 
-Ended run(const std::optional<std::string> &command)
+Ended run(const Checked &command)
 {
-    if (!command || !fits_command(*command)) return failed("a value is refused");
+    if (!command) return failed(command.refusal().why);
+    if (!fits_command(*command)) return failed(refused("probe command", "too long").why);
     ShellReader output(*command);
-    if (!output.started()) return failed("the command could not be started");
+    if (!output.started()) return failed(NOT_STARTED);
     Ended ended{};
     std::string line;
     while (output.read_line(line)) {
@@ -86,7 +85,7 @@ Ended run(const std::optional<std::string> &command)
     return ended;
 }
 
-DaemonReply reply_of(const std::optional<std::string> &command)
+DaemonAnswer reply_of(const Checked &command)
 {
     const Ended ended = run(command);
     const std::string &first = ended.reply.first();
@@ -100,39 +99,35 @@ DaemonReply reply_of(const std::optional<std::string> &command)
 
 } // namespace
 
-LoginReply try_login(SshLogin login)
+LoginAnswer try_login(const RsyncJob &job, SshLogin login)
 {
-    const Ended ended = run(ssh_test_command(CurrentJob, login));
+    const Ended ended = run(ssh_test_command(job, login));
     const std::string &line = ended.reply.first();
     const auto result = judge_ssh_reply(line);
     return {result == SSH_OK && ended.code != 0 ? SSH_FAILED : result, line};
 }
 
-DaemonReply ask_daemon()
+DaemonAnswer ask_daemon(const RsyncJob &job)
 {
-    return reply_of(module_list_command(CurrentJob));
+    return reply_of(module_list_command(job));
 }
 
-DaemonReply ask_port()
+DaemonAnswer ask_port(const RsyncJob &job)
 {
-    auto command = module_list_command(CurrentJob);
+    const Checked command = module_list_command(job);
+    if (!command || refusal_of_port(job.port)) return reply_of(command);
     constexpr std::string_view PROGRAM = "/usr/sbin/rsync";
-    if (command && is_safe_port(CurrentJob.port)) {
-        command->insert(PROGRAM.size(), std::string(" --port=") + CurrentJob.port);
-    }
-    return reply_of(command);
+    return reply_of(std::string(PROGRAM) + " --port=" + job.port + command->substr(PROGRAM.size()));
 }
 
-DaemonReply look_for_target()
+DaemonAnswer look_for_target(const RsyncJob &job)
 {
-    return reply_of(write_test_command(CurrentJob, 0));
+    return reply_of(write_test_command(job, 0));
 }
 
-DaemonReply try_transfer(const RsyncJob &job)
+DaemonAnswer try_transfer(const Checked &command)
 {
-    const auto command = rsync_transfer_command(job);
-    if (!command) return reply_of(command);
-    return reply_of(*command + " --no-recursive --dirs --dry-run 2>&1");
+    return reply_of(command ? *command + " --no-recursive --dirs --dry-run 2>&1" : command);
 }
 
 } // namespace bakjob::ctl

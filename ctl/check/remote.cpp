@@ -35,7 +35,7 @@ bool is_measured(const RemoteModule &module)
 // an appliance of the same kind use it. False when it is not let in.
 bool measure_modules()
 {
-    const bool let_in = try_login(SshLogin::as_client).result == SSH_OK;
+    const bool let_in = try_login(CurrentJob, SshLogin::as_client).result == SSH_OK;
     if (let_in) {
         CurrentJob.server_type = SERVER_SAME_KIND;
         rsync_discover_remote();
@@ -57,7 +57,7 @@ bool measure_path()
 {
     rsync_list_daemon_modules();
     const auto login = ssh_login_of(CurrentJob);
-    if (!login || try_login(*login).result != SSH_OK) return false;
+    if (!login || try_login(CurrentJob, *login).result != SSH_OK) return false;
     rsync_remote_du(CurrentJob.remote_path, module_list->remote_size);
     rsync_remote_free_space(module_list->remote_free);
     return true;
@@ -67,7 +67,7 @@ bool measure_path()
 bool discover(RsyncJob &job)
 {
     rsync_prepare_current_job(job);
-    const DaemonReply reply = ask_daemon();
+    const DaemonAnswer reply = ask_daemon(CurrentJob);
     if (reply.result != REPLY_OK) {
         throw Failure("the rsync daemon cannot be asked: " + printable(reply.line));
     }

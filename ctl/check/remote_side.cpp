@@ -9,6 +9,7 @@
 #include "output/words.h"
 #include "remote/remote_dir.h"
 #include "transfer/backup.h"
+#include "transfer/plan.h"
 
 #include <optional>
 #include <string_view>
@@ -42,11 +43,11 @@ public:
         copy_text(job_.job_name, name_.text());
         job_.rsync_pwd_file[0] = '\0';
         if (job_.server_type == SERVER_SAME_KIND) copy_text(job_.rsync_user, "root"); // as the transfer does
-        rsync_prepare_current_job(job_);
+        job_ = rsync_with_defaults(job_);
         copy_text(password_path, job_.rsync_pwd_file);
         copy_text(config_path, remote_config_copy(name_));
         on_signal_.emplace(remove_files);
-        ready_ = rsync_write_password_file() || job.rsync_mode != RSYNC_MODE_DAEMON;
+        ready_ = !write_password_file(job_) || job.rsync_mode != RSYNC_MODE_DAEMON;
     }
     ProbeJob(const ProbeJob &) = delete;
     ProbeJob &operator=(const ProbeJob &) = delete;
@@ -84,8 +85,8 @@ private:
         findings_.push_back({verdict, about, what, todo});
     }
     void report(const std::string &about, const Advice &advice, const std::string &line);
-    void preparation(const std::string &folder);
-    bool misled(const std::string &folder, const DaemonReply &target);
+    void preparation(const std::string &folder, const std::string &target);
+    bool misled(const std::string &folder, const DaemonAnswer &target);
 
     [[nodiscard]] bool to_module() const { return job_.rsync_mode == RSYNC_MODE_DAEMON; }
 
@@ -108,17 +109,16 @@ bool RemoteCheck::login()
     if (job_.use_ssh != 1 && to_module()) return true;
     const auto kind = job_.use_ssh == 1 ? ssh_login_of(job_) : SshLogin::as_client;
     if (!kind) return false; // the values say why
-    const RsyncJob kept = CurrentJob;
-    if (job_.use_ssh != 1) CurrentJob.ssh_pwd[0] = '\0';
-    const LoginReply reply = try_login(*kind);
-    rsync_copy_job(CurrentJob, kept);
+    RsyncJob job = probe_.job();
+    if (job.use_ssh != 1) job.ssh_pwd[0] = '\0';
+    const LoginAnswer reply = try_login(job, *kind);
     report("ssh login", advice_of_login(reply.result), reply.line);
     return reply.result == SSH_OK;
 }
 
 bool RemoteCheck::daemon()
 {
-    const DaemonReply reply = ask_daemon();
+    const DaemonAnswer reply = ask_daemon(probe_.job());
     if (reply.result != REPLY_OK) {
         report("rsync daemon", advice_of_reply(reply.result), reply.line);
         return false;
@@ -130,7 +130,7 @@ bool RemoteCheck::daemon()
     }
     add(Verdict::FINE, "rsync daemon", "answers");
     if (std::string_view(job_.port) == DEFAULT_PORT || job_.use_ssh == 1) return true;
-    const DaemonReply own = ask_port();
+    const DaemonAnswer own = ask_port(probe_.job());
     if (own.result == REPLY_OK) return true;
     const std::string port = std::string("port ") + job_.port;
     report(port, {advice_of_reply(own.result).what, "bakjobctl set NAME port=873, or whatever is right."},
@@ -142,25 +142,25 @@ bool RemoteCheck::daemon()
 bool RemoteCheck::target()
 {
     if (!to_module() || job_.backup_type != BACKUP_PUSH) return true;
-    const DaemonReply reply = look_for_target();
+    const DaemonAnswer reply = look_for_target(probe_.job());
     if (reply.result == REPLY_NO_DIR) return true;
     report("remote_path", advice_of_reply(reply.result), reply.line);
     return reply.result == REPLY_OK;
 }
 
 // What a run would do about a folder that is missing at the target of a push to a module.
-void RemoteCheck::preparation(const std::string &folder)
+void RemoteCheck::preparation(const std::string &folder, const std::string &target)
 {
     const std::string_view path = job_.remote_path;
     const std::string module(path.substr(0, path.find('/')));
     if (path.find_first_not_of('/', module.size()) != std::string_view::npos) {
         add(Verdict::PROBLEM, folder,
             std::string("is not there yet, and a run makes it only where remote_path is a module alone: ") +
-                CurrentJob.remote_path,
+                target,
             "Make this folder there.");
         return;
     }
-    const LoginReply reply = try_login(SshLogin::as_client);
+    const LoginAnswer reply = try_login(probe_.job(), SshLogin::as_client);
     const Advice advice = advice_of_login(reply.result);
     if (reply.result != SSH_OK) {
         const bool denied = reply.result == SSH_DENIED;
@@ -168,7 +168,7 @@ void RemoteCheck::preparation(const std::string &folder)
             "is not there yet, and the ssh login by which a run makes it " + std::string(advice.what) + ": " +
                 reply.line,
             denied ? "Give ssh_pwd the password of root over there, or make the folder there." : advice.todo);
-    } else if (!rsync_find_module_folder(probe_.name(), module)) {
+    } else if (!find_module_folder(probe_.job(), probe_.name(), module)) {
         add(Verdict::PROBLEM, folder,
             "is not there yet, and /etc/rsyncd.conf over there has no header \"[ " + module +
                 " ]\" with a \"path = \" line, by which a run finds where to make it",
@@ -179,7 +179,7 @@ void RemoteCheck::preparation(const std::string &folder)
 }
 
 // Whether a run would act on a folder by what it takes for the truth. It acts on a missing one alone.
-bool RemoteCheck::misled(const std::string &folder, const DaemonReply &target)
+bool RemoteCheck::misled(const std::string &folder, const DaemonAnswer &target)
 {
     const bool pushes = job_.backup_type == BACKUP_PUSH;
     const bool missing = target.result == REPLY_NO_DIR;
@@ -200,23 +200,21 @@ bool RemoteCheck::misled(const std::string &folder, const DaemonReply &target)
 void RemoteCheck::folder(const std::string &folder)
 {
     RsyncJob ended = probe_.job();
-    const bool found = rsync_resolve_folder(root_, folder) == 0;
-    if (!found || !copy_text(ended.local_path, folder) || !rsync_set_ends(ended, folder)) return;
-    copy_text(CurrentJob.remote_path, ended.remote_path);
-    const DaemonReply target = look_for_target();
+    if (enter_share(root_, folder) || set_ends(ended, folder)) return; // said by the look at this device
+    const DaemonAnswer target = look_for_target(ended);
     const bool pushes = job_.backup_type == BACKUP_PUSH;
     if (misled(folder, target)) return;
     if (target.result == REPLY_NO_DIR && !pushes) {
         report(folder, {"is not there", "A pull fetches what lies in the folder of this name over there."},
                target.line);
     } else if (target.result == REPLY_NO_DIR && to_module()) {
-        preparation(folder);
+        preparation(folder, ended.remote_path);
     } else {
-        DaemonReply transfer = try_transfer(ended);
+        DaemonAnswer transfer = try_transfer(plan_transfer(ended, ended).command);
         if (transfer.result == REPLY_OK && pushes && !to_module()) {
             // The dry run of a folder does not say that its parent is missing; that of a file does.
             copy_text(ended.local_path, "/etc/hosts");
-            transfer = try_transfer(ended);
+            transfer = try_transfer(plan_transfer(ended, ended).command);
         }
         report(folder, advice_of_reply(transfer.result), transfer.line);
     }

@@ -24,7 +24,7 @@ bool has_no_control(std::string_view text)
 
 bool is_host(std::string_view text)
 {
-    return !text.empty() && is_safe_host(text);
+    return !text.empty() && !refusal_of_host(text);
 }
 
 // A run takes blanks behind the number.
@@ -62,12 +62,12 @@ constexpr const char *NAME_RULE = "not empty, no blank, nothing that a shell act
 
 bool is_ssh_user(std::string_view text)
 {
-    return !text.empty() && is_safe_ssh_user(text);
+    return !text.empty() && !refusal_of_ssh_user(text);
 }
 
 bool is_rsync_user(std::string_view text)
 {
-    return !text.empty() && is_safe_rsync_user(text);
+    return !text.empty() && !refusal_of_rsync_user(text);
 }
 
 bool is_password(std::string_view text)

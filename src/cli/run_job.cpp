@@ -33,11 +33,6 @@ namespace
 constexpr int ALERT_LEVEL = 1;
 constexpr std::size_t VOLUME_PREFIX_LENGTH = 14; // of "/mnt/HD/HD_a2/"
 
-bool is_restore_run()
-{
-    return run_options.restore_mode == 1;
-}
-
 std::optional<RsyncJob> load_enabled_job(const JobName &name)
 {
     std::optional<RsyncJob> copy;
@@ -48,24 +43,36 @@ std::optional<RsyncJob> load_enabled_job(const JobName &name)
     return copy;
 }
 
-// Silent refusals: nobody asked for this run now, or there is nothing to recover from.
-bool is_due(const RsyncJob &job, bool force)
+// Without a trace: nobody asked for this run now, or there is nothing to recover from.
+Refusal refusal_now(const RsyncJob &job, bool force)
 {
-    if (job.schedule_mode == SCHEDULE_ONCE && job.state != JOB_IDLE && !force) return false;
-    if (run_options.recover_seq == 0) return true;
-    return job.inc_enable == 1 && rsync_list_snapshots(job.job_name) != 0;
+    if (job.schedule_mode == SCHEDULE_ONCE && job.state != JOB_IDLE && !force)
+        return {"it runs once, and has"};
+    if (!is_recover_run() || (job.inc_enable == 1 && rsync_list_snapshots(job.job_name) != 0)) return {};
+    return {"there is no snapshot to recover"};
 }
 
-PidFile take_pid_file(const JobName &name)
+Refusal refusal_of_pid_file(const PidFile &file)
 {
-    PidFile file = rsync_write_pid_file(name);
-    if (file.handle) return file;
-    if (errno == EEXIST) {
-        DebugLog("ERROR: rsync backup is running!\n");
-    } else {
-        DebugLog("ERROR: pid file [%s]: %s\n", file.path.c_str(), std::strerror(errno));
+    if (errno == EEXIST) return trace_refusal("rsync backup is running!");
+    return trace_refusal("pid file [" + file.path + "]: " + std::strerror(errno));
+}
+
+RunReport not_started(const Refusal &refusal)
+{
+    return {{}, {.step = RunStep::START, .seen = refusal.why}};
+}
+
+std::string alert_text_of(const RsyncJob &job)
+{
+    char device[128] = "";
+    xml_get_str("/system_mgr/samba/netbios_name", sizeof device, device);
+    std::string_view place = job.remote_path;
+    if (job.backup_type == BACKUP_PULL) {
+        place = job.local_path;
+        place.remove_prefix(std::min(place.size(), VOLUME_PREFIX_LENGTH));
     }
-    return file;
+    return format_text("%s,%s,%s", job.job_name, device, place.data());
 }
 
 void raise_alert(const RsyncJob &job, bool done)
@@ -82,42 +89,53 @@ struct FolderPlace {
     int count;
 };
 
-// `job` is a copy for this folder alone.
-bool run_folder(RsyncJob job, const JobName &name, const std::optional<std::string> &root,
-                const FolderPlace &place)
+FolderOutcome not_begun(const Refusal &refusal)
 {
-    copy_text(job.local_path, place.folder);
-    bool done = root && rsync_resolve_folder(*root, place.folder) == 0;
-    if (done) {
-        rsync_write_progress(name, place.folder, place.index, place.count);
-        done = rsync_set_ends(job, place.folder) && rsync_run_backup(name, job) == BACKUP_DONE;
-    }
-    raise_alert(job, done);
-    return done;
+    return {BACKUP_FAILED, {.step = RunStep::FOLDER, .seen = refusal.why}};
 }
 
-bool run_folders(const RsyncJob &job, const JobName &name)
+// `job` becomes that of this folder alone.
+FolderOutcome bring_over(RsyncJob &job, const JobName &name, const Checked &root, const FolderPlace &place)
 {
-    const auto root = rsync_remote_root(name);
+    copy_text(job.local_path, place.folder); // for the alert
+    if (!root) return not_begun(root.refusal());
+    if (const Refusal refusal = enter_share(*root, place.folder)) return not_begun(refusal);
+    rsync_write_progress(name, place.folder, place.index, place.count);
+    if (const Refusal refusal = set_ends(job, place.folder)) return not_begun(refusal);
+    return transfer_folder(name, job);
+}
+
+// `job` is a copy for this folder alone.
+FolderOutcome run_folder(RsyncJob job, const JobName &name, const Checked &root, const FolderPlace &place)
+{
+    FolderOutcome outcome = bring_over(job, name, root, place);
+    outcome.reason.folder = place.folder;
+    raise_alert(job, outcome.result == BACKUP_DONE);
+    return outcome;
+}
+
+std::vector<FolderOutcome> run_folders(const RsyncJob &job, const JobName &name)
+{
+    const Checked root = rsync_remote_root(name);
     RsyncJob to_split = job;
     FolderTable folders{};
     rsync_split_folders(to_split, folders);
-    bool all_done = true;
+    std::vector<FolderOutcome> outcomes;
     for (int i = 0; i < folders.count; ++i) {
-        all_done &= run_folder(job, name, root, {folders.entries[i], i + 1, folders.count});
+        outcomes.push_back(run_folder(job, name, root, {folders.entries[i], i + 1, folders.count}));
     }
     if (folders.left_out > 0) {
-        DebugLog("ERROR: local_path refused: %d folders too many or too long\n", folders.left_out);
+        outcomes.push_back(not_begun(
+            refused("local_path", format_text("%d folders too many or too long", folders.left_out))));
         raise_alert(job, false);
-        all_done = false;
     }
-    return all_done;
+    return outcomes;
 }
 
 JobState final_state(const RsyncJob &job, bool outcome)
 {
     if (outcome) return job.schedule_mode == SCHEDULE_EVENT ? JOB_DONE_SCHEDULED : JOB_DONE;
-    return run_options.recover_seq != 0 ? JOB_RECOVER_FAILED : JOB_FAILED;
+    return is_recover_run() ? JOB_RECOVER_FAILED : JOB_FAILED;
 }
 
 // A run that began while its job was being killed may have been killed, too.
@@ -133,49 +151,51 @@ void clear_dead_run(const JobName &name)
 
 void rsync_alert_text(const RsyncJob &job)
 {
-    char device[128] = "";
-    xml_get_str("/system_mgr/samba/netbios_name", sizeof device, device);
-    std::string_view place = job.remote_path;
-    if (job.backup_type == BACKUP_PULL) {
-        place = job.local_path;
-        place.remove_prefix(std::min(place.size(), VOLUME_PREFIX_LENGTH));
-    }
-    const std::string text = format_text("%s,%s,%s", job.job_name, device, place.data());
-    copy_text(run_options.alert_text, text.substr(0, sizeof run_options.alert_text - 1));
+    copy_text(run_options.alert_text, alert_text_of(job).substr(0, sizeof run_options.alert_text - 1));
 }
 
-bool rsync_run_job(const std::string &job_name, bool force, bool &outcome)
+bool RunReport::all_done() const
+{
+    return std::all_of(folders.begin(), folders.end(),
+                       [](const FolderOutcome &folder) { return folder.result == BACKUP_DONE; });
+}
+
+RunReport run_job(const std::string &job_name, bool force, bool all_done_before)
 {
     const auto name = JobName::checked(job_name);
-    if (name && !rsync_pid_file_absent(*name)) {
-        DebugLog("ERROR: rsync backup is running!\n");
-        return false;
-    }
+    if (name && !rsync_pid_file_absent(*name)) return not_started(trace_refusal("rsync backup is running!"));
     auto job = name ? load_enabled_job(*name) : std::nullopt;
-    if (!job) {
-        DebugLog("ERROR: not found this job_name [%s] or disabled\n", job_name.c_str());
-        return false;
-    }
-    if (!is_due(*job, force)) return false;
+    if (!job) return not_started(trace_refusal("not found this job_name [" + job_name + "] or disabled"));
+    if (const Refusal refusal = refusal_now(*job, force)) return not_started(refusal);
     if (is_restore_run()) job->backup_type = BACKUP_PULL;
 
     const std::vector<std::string> files = rsync_files_of_run(*name);
     const CatchInterrupts interrupts;
-    const PidFile pid_file = take_pid_file(*name);
-    if (!pid_file.handle) return false;
+    const PidFile pid_file = rsync_write_pid_file(*name);
+    if (!pid_file.handle) return not_started(refusal_of_pid_file(pid_file));
+    RunReport report;
     try {
         rsync_set_job_state(job_name, JOB_STARTING);
-        if (!run_folders(*job, *name)) outcome = false;
-        rsync_set_job_state(job_name, final_state(*job, outcome));
+        report.folders = run_folders(*job, *name);
+        rsync_set_job_state(job_name, final_state(*job, all_done_before && report.all_done()));
     } catch (const Interrupted &) {
         rsync_end_broken_run(*name, pid_file, files);
-        return false; // to whoever handles the signal; by default, nobody is left
+        // To whoever handles the signal; by default, nobody is left.
+        report.reason = {.step = RunStep::INTERRUPTED, .seen = "a signal"};
+        return report;
     } catch (...) {
         rsync_end_broken_run(*name, pid_file, files);
         throw;
     }
     rsync_remove_pid_file(pid_file);
-    return true;
+    return report;
+}
+
+bool rsync_run_job(const std::string &job_name, bool force, bool &outcome)
+{
+    const RunReport report = run_job(job_name, force, outcome);
+    outcome = outcome && report.all_done();
+    return !report.reason;
 }
 
 void rsync_kill_job(const std::string &job_name)

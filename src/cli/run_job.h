@@ -3,8 +3,10 @@
 // What -r and -k do: one whole run of a job, folder by folder, and its end on request.
 
 #include "config/job.h"
+#include "transfer/backup.h"
 
 #include <string>
+#include <vector>
 
 namespace bakjob
 {
@@ -16,10 +18,20 @@ enum AlertCode : int {
     ALERT_RESTORE_DONE = 2403
 };
 
-// Runs the job: blocks until its last folder. `force` runs a job again that runs only once; `outcome` is
-// cleared when a folder fails, and never set. False when the run was refused: then nothing was changed.
-// SIGHUP, SIGINT and SIGTERM, unless they are ignored, end the run in order (broken_run.h) and then act as
-// they would have without it; if that does not end the process, the result is false.
+struct RunReport {
+    std::vector<FolderOutcome> folders; // in their order; one more for those that could not be looked at
+    Reason reason{};                    // it was refused, and nothing was changed, or interrupted
+
+    [[nodiscard]] bool all_done() const;
+};
+
+// Runs the job: blocks until its last folder. `force` runs a job again that runs only once; the job is
+// recorded as done only with `all_done_before`. SIGHUP, SIGINT and SIGTERM, unless they are ignored, end the
+// run in order (broken_run.h) and then act as they would have without it.
+RunReport run_job(const std::string &job_name, bool force, bool all_done_before = true);
+
+// The same. `outcome` is cleared when a folder fails, and never set. False when the run was refused or
+// interrupted.
 bool rsync_run_job(const std::string &job_name, bool force, bool &outcome);
 
 // Kills the job's process, its transfers and all else that it has started, and records that it was killed.

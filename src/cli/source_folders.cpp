@@ -113,25 +113,31 @@ void rsync_split_folders(RsyncJob &job, FolderTable &table)
     if (cut) ++table.left_out;
 }
 
-int rsync_resolve_folder(const std::string &remote_backup_root, const std::string &folder)
+Refusal enter_share(const std::string &remote_backup_root, const std::string &folder)
 {
     share_remote_dir[0] = share_path[0] = share_subdir[0] = '\0';
     const ShareTable shares;
-    if (leaves_share(folder)) {
-        DebugLog("ERROR: local_path refused: [%s] has a \"..\" step\n", folder.c_str());
-        return -1;
-    }
+    if (leaves_share(folder)) return refused("local_path", '[' + folder + "] has a \"..\" step");
     const char *const share = shares.holding(folder);
-    if (share == nullptr || !fill_buffers(remote_backup_root, share, folder)) return -1;
-    return chdir(share_path);
+    if (share == nullptr) return refused("local_path", "no share holds [" + folder + ']');
+    if (!fill_buffers(remote_backup_root, share, folder)) {
+        return refused("local_path", '[' + folder + "] is too long");
+    }
+    if (chdir(share_path) == 0) return {};
+    return trace_refusal(std::string("share [") + share_path +
+                         "] cannot be entered: " + std::strerror(errno));
 }
 
-std::optional<std::string> rsync_remote_root(const JobName &job)
+int rsync_resolve_folder(const std::string &remote_backup_root, const std::string &folder)
+{
+    return enter_share(remote_backup_root, folder) ? -1 : 0;
+}
+
+Checked rsync_remote_root(const JobName &job)
 {
     const SerialFile file = read_serial_file();
     if (!file.refusal.empty()) {
-        DebugLog("ERROR: serial text of [%s] refused: %s\n", SERIAL_FILE, file.refusal.c_str());
-        return std::nullopt;
+        return refused(std::string("serial text of [") + SERIAL_FILE + ']', file.refusal);
     }
     const std::string serial = file.text.value_or("");
     if (serial.find_first_of("\r\n") != std::string::npos) {
@@ -141,17 +147,14 @@ std::optional<std::string> rsync_remote_root(const JobName &job)
     return format_text("/%s_remote_backup/%s", serial.c_str(), job.c_str());
 }
 
-bool rsync_set_ends(RsyncJob &job, const std::string &folder)
+Refusal set_ends(RsyncJob &job, const std::string &folder)
 {
     std::string remote_path = std::string(job.remote_path) + share_remote_dir;
-    if (run_options.restore_mode == 1) {
-        copy_text(job.local_path, share_path);
-    } else {
-        remote_path += folder.substr(std::strlen(share_path));
+    if (!is_restore_run()) remote_path += folder.substr(std::strlen(share_path));
+    if (!copy_text(job.local_path, is_restore_run() ? share_path : folder)) {
+        return refused("local_path", "too long");
     }
-    if (copy_text(job.remote_path, remote_path)) return true;
-    DebugLog("ERROR: remote_path refused: too long\n");
-    return false;
+    return copy_text(job.remote_path, remote_path) ? Refusal() : refused("remote_path", "too long");
 }
 
 void rsync_write_progress(const JobName &job, const std::string &folder, int index, int count)

@@ -6,10 +6,10 @@
 
 #include "common/folder_table.h"
 #include "common/job_name.h"
+#include "common/refusal.h"
 #include "config/job.h"
 
 #include <cstddef>
-#include <optional>
 #include <string>
 
 namespace bakjob
@@ -22,18 +22,20 @@ inline constexpr std::size_t SERIAL_SIZE = 128;
 void rsync_split_folders(RsyncJob &job, FolderTable &table);
 
 // Finds the first share that holds the folder, fills the share buffers and changes the working directory to
-// the share's path. -1 when no share holds it, it has a ".." step, a text does not fit, or the share's path
-// cannot be entered.
+// the share's path. A refusal when no share holds it, it has a ".." step, a text does not fit, or the share's
+// path cannot be entered.
+Refusal enter_share(const std::string &remote_backup_root, const std::string &folder);
+
+// The same: 0, or -1 when refused.
 int rsync_resolve_folder(const std::string &remote_backup_root, const std::string &folder);
 
-// The folder below a job's `remote_path` in which all its data lies, "/SERIAL_remote_backup/JOB". Nothing,
-// with a trace, when the serial text is refused: without it, or with a wrong one, the data would be looked
-// for elsewhere.
-std::optional<std::string> rsync_remote_root(const JobName &job);
+// The folder below a job's `remote_path` in which all its data lies, "/SERIAL_remote_backup/JOB". Refused
+// when the serial text is: without it, or with a wrong one, the data would be looked for elsewhere.
+Checked rsync_remote_root(const JobName &job);
 
-// Points the job at the two ends of the folder that was just resolved: `local_path` in a restore run at the
-// share, `remote_path` at the folder's place. False when that does not fit.
-bool rsync_set_ends(RsyncJob &job, const std::string &folder);
+// Points the job at the two ends of the folder that was just resolved: `local_path` at the folder, in a
+// restore run at its share, `remote_path` at the folder's place. A refusal when they do not fit.
+Refusal set_ends(RsyncJob &job, const std::string &folder);
 
 // Publishes which folder (`index` from 1 of `count`) is being transferred.
 void rsync_write_progress(const JobName &job, const std::string &folder, int index, int count);

@@ -18,4 +18,14 @@ struct RunOptions {
 
 extern RunOptions run_options;
 
+inline bool is_restore_run()
+{
+    return run_options.restore_mode != 0;
+}
+
+inline bool is_recover_run()
+{
+    return run_options.recover_seq != 0;
+}
+
 } // namespace bakjob

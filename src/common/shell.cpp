@@ -1,5 +1,6 @@
 #include "common/shell.h"
 
+#include "common/debug_log.h"
 #include "common/interrupt.h"
 #include "common/text.h"
 
@@ -82,7 +83,9 @@ pid_t start_shell(const std::string &command, int output, sigset_t signals)
                     const_cast<char *const *>(environment));
     posix_spawnattr_destroy(&attributes);
     posix_spawn_file_actions_destroy(&handles);
-    return failure == 0 ? child : -1;
+    if (failure == 0) return child;
+    DebugLog("ERROR: the shell could not be started: %s\n", std::strerror(failure));
+    return -1;
 }
 
 int wait_for(pid_t child)
@@ -123,7 +126,10 @@ ShellReader::ShellReader(const std::string &command)
     throw_if_interrupted();
     std::fflush(stdout);
     int ends[2];
-    if (pipe2(ends, O_CLOEXEC) != 0) return;
+    if (pipe2(ends, O_CLOEXEC) != 0) {
+        DebugLog("ERROR: no pipe for a command: %s\n", std::strerror(errno));
+        return;
+    }
     UniqueFd reading(ends[0]);
     const UniqueFd writing(ends[1]);
     child_ = start_shell(command, writing.get(), {});

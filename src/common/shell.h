@@ -29,6 +29,9 @@ inline bool fits_command(const std::string &command)
     return command.size() < COMMAND_SIZE;
 }
 
+// What is seen of a command that could not be started; the trace says why.
+inline constexpr const char *NOT_STARTED = "the command could not be started";
+
 // Runs the command and waits. Its wait status, 0 for success; -1 when it could not be started.
 int run_shell(const std::string &command);
 

@@ -12,18 +12,25 @@ char share_remote_dir[PATH_SIZE];
 char share_path[PATH_SIZE];
 char share_subdir[PATH_SIZE];
 
+RsyncJob rsync_with_defaults(const RsyncJob &job)
+{
+    RsyncJob filled = job;
+    const auto name = JobName::checked(job.job_name);
+    if (filled.rsync_pwd_file[0] == '\0' && name) copy_text(filled.rsync_pwd_file, password_file(*name));
+    if (filled.rsync_user[0] == '\0') copy_text(filled.rsync_user, "root");
+    if (filled.rsync_pwd[0] == '\0') {
+        copy_text(filled.rsync_pwd, DEFAULT_DAEMON_PASSWORD);
+        filled.pwd_encoded = 0;
+    }
+    if (filled.port[0] == '\0') copy_text(filled.port, DEFAULT_PORT);
+    if (filled.inc_enable != 0) filled.inc_number = snapshots_kept(filled.inc_number);
+    return filled;
+}
+
 void rsync_prepare_current_job(RsyncJob &job)
 {
-    const auto name = JobName::checked(job.job_name);
-    if (job.rsync_pwd_file[0] == '\0' && name) copy_text(job.rsync_pwd_file, password_file(*name));
-    rsync_copy_job(CurrentJob, job);
-    if (CurrentJob.rsync_user[0] == '\0') copy_text(CurrentJob.rsync_user, "root");
-    if (CurrentJob.rsync_pwd[0] == '\0') {
-        copy_text(CurrentJob.rsync_pwd, DEFAULT_DAEMON_PASSWORD);
-        CurrentJob.pwd_encoded = 0;
-    }
-    if (CurrentJob.port[0] == '\0') copy_text(CurrentJob.port, DEFAULT_PORT);
-    if (CurrentJob.inc_enable != 0) CurrentJob.inc_number = snapshots_kept(CurrentJob.inc_number);
+    rsync_copy_job(CurrentJob, rsync_with_defaults(job));
+    copy_text(job.rsync_pwd_file, CurrentJob.rsync_pwd_file);
 }
 
 } // namespace bakjob

@@ -10,8 +10,11 @@ namespace bakjob
 
 extern RsyncJob CurrentJob;
 
-// Fills CurrentJob from the caller's job. Of the defaults, only that of `rsync_pwd_file` is written back into
-// the caller's job; a job without a proper name has none.
+// The job with its defaults filled in. A job without a proper name has no password file.
+RsyncJob rsync_with_defaults(const RsyncJob &job);
+
+// Fills CurrentJob with the caller's job and its defaults, of which only `rsync_pwd_file` is written back
+// into the caller's job.
 void rsync_prepare_current_job(RsyncJob &job);
 
 // Filled when the folder is resolved.

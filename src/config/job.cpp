@@ -80,14 +80,12 @@ const char *text_field(const RsyncJob &job, const JobField &field)
     return text_field(const_cast<RsyncJob &>(job), field);
 }
 
-bool has_whole_texts(const RsyncJob &job)
+Refusal refusal_of_cut_text(const RsyncJob &job)
 {
     for (const JobField &field : FIELDS) {
-        if (!field.in_commands || !was_cut(job, field.key)) continue;
-        DebugLog("ERROR: %s refused: too long\n", field.key);
-        return false;
+        if (field.in_commands && was_cut(job, field.key)) return refused(field.key, "too long");
     }
-    return true;
+    return {};
 }
 
 const std::string *whole_text_of(const RsyncJob &job, std::string_view key)

@@ -4,6 +4,7 @@
 // configuration store. Texts always hold a terminated string and never more than their size.
 
 #include "common/password.h"
+#include "common/refusal.h"
 
 #include <climits>
 #include <cstddef>
@@ -82,8 +83,8 @@ char *text_field(RsyncJob &job, const JobField &field);
 const std::int32_t &integer_field(const RsyncJob &job, const JobField &field);
 const char *text_field(const RsyncJob &job, const JobField &field);
 
-// False, with a trace, when a text that commands need was cut.
-bool has_whole_texts(const RsyncJob &job);
+// Of a job with a text that commands need and that was cut.
+Refusal refusal_of_cut_text(const RsyncJob &job);
 
 // The text of that key as the store has it, when it had to be cut; else null.
 const std::string *whole_text_of(const RsyncJob &job, std::string_view key);

@@ -26,8 +26,8 @@ namespace
 {
 
 constexpr std::string_view PATH_KEY = "path = ";
-constexpr int MOST_TESTS = 10;
-constexpr off_t MOST_BYTES = off_t{1024} * 1024; // of a configuration: the remote side may never end it
+constexpr int MAX_TESTS = 10;
+constexpr off_t MAX_BYTES = off_t{1024} * 1024; // of a configuration: the remote side may never end it
 
 // Size of the file behind a handle; 0 when that is no plain file.
 off_t file_size(int fd)
@@ -43,7 +43,7 @@ class FileSizeLimit
 public:
     FileSizeLimit()
     {
-        lower(RLIMIT_FSIZE, size_, MOST_BYTES + std::max(file_size(STDOUT_FILENO), file_size(STDERR_FILENO)));
+        lower(RLIMIT_FSIZE, size_, MAX_BYTES + std::max(file_size(STDOUT_FILENO), file_size(STDERR_FILENO)));
         lower(RLIMIT_CORE, core_, 0);
         struct sigaction action = {};
         action.sa_handler = SIG_DFL; // as the command inherits it
@@ -72,14 +72,14 @@ private:
     struct sigaction signal_ = {};
 };
 
-// False, with a trace and the file removed, when it is as large as it could become.
-bool is_whole(const std::string &local_copy)
+// Of a copy that is as large as it could become, which is removed.
+Refusal refusal_of_size(const std::string &local_copy)
 {
     struct stat status = {};
-    if (lstat(local_copy.c_str(), &status) != 0 || status.st_size < MOST_BYTES) return true;
-    DebugLog("ERROR: [%s] refused: larger than 1 MiB\n", local_copy.c_str());
+    if (lstat(local_copy.c_str(), &status) != 0 || status.st_size < MAX_BYTES) return {};
+    const Refusal refusal = refused('[' + local_copy + ']', "larger than 1 MiB");
     std::remove(local_copy.c_str());
-    return false;
+    return refusal;
 }
 
 void wait_a_second()
@@ -91,7 +91,7 @@ void wait_a_second()
 bool wait_for_file(const std::string &path)
 {
     wait_a_second();
-    for (int test = 0; test < MOST_TESTS; ++test) {
+    for (int test = 0; test < MAX_TESTS; ++test) {
         if (access(path.c_str(), F_OK) == 0) return true;
         wait_a_second();
     }
@@ -99,6 +99,11 @@ bool wait_for_file(const std::string &path)
 }
 
 } // namespace
+
+std::string not_fetched(int exit_code)
+{
+    return format_text("/etc/rsyncd.conf over there was not fetched: exit code %d", exit_code);
+}
 
 std::optional<std::string> section_name(std::string_view line)
 {
@@ -131,24 +136,27 @@ bool read_daemon_config(const std::string &local_copy, const std::function<bool(
     return true;
 }
 
-bool fetch_daemon_config(const std::string &local_copy)
+FetchedConfig fetch_daemon_config(const RsyncJob &job, const std::string &local_copy)
 {
-    const auto word = shell_path("local copy", local_copy);
-    if (!word) return false;
-    const auto command = ssh_command(CurrentJob, SshLogin::as_client, "cat /etc/rsyncd.conf > " + *word);
-    if (!command) return false;
+    const Checked word = shell_path("local copy", local_copy);
+    if (!word) return {-1, word.refusal()};
+    const Checked command = ssh_command(job, SshLogin::as_client, "cat /etc/rsyncd.conf > " + *word);
+    if (!command) return {-1, command.refusal()};
     // The shell would write through a link of that name: with a file of ours in place nobody else can put
     // one.
     if (!replace_file(local_copy, 0600, "")) {
-        DebugLog("ERROR: [%s]: %s\n", local_copy.c_str(), std::strerror(errno));
-        return false;
+        return {-1, trace_refusal('[' + local_copy + "]: " + std::strerror(errno))};
     }
     DebugLog("[%s]\n", command->c_str());
+    int code = 0;
     {
         const FileSizeLimit limit;
-        run_shell(*command);
+        code = exit_code(run_shell(*command));
     }
-    return is_whole(local_copy) && wait_for_file(local_copy);
+    if (Refusal refusal = refusal_of_size(local_copy)) return {code, refusal};
+    if (!wait_for_file(local_copy)) return {code, trace_refusal('[' + local_copy + "] has gone")};
+    if (code != 0) trace_refusal(not_fetched(code));
+    return {code, {}};
 }
 
 } // namespace bakjob

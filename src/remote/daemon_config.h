@@ -4,6 +4,9 @@
 // start of its line, and "path = FOLDER" at the start of a later one. The text comes from elsewhere: names
 // and folders are only data here.
 
+#include "common/refusal.h"
+#include "config/job.h"
+
 #include <functional>
 #include <optional>
 #include <string>
@@ -23,9 +26,16 @@ std::optional<std::string> path_of_line(std::string_view line);
 // answers false. False when it cannot be opened.
 bool read_daemon_config(const std::string &local_copy, const std::function<bool(const std::string &)> &line);
 
-// Fetches the remote host's "/etc/rsyncd.conf" over ssh into `local_copy` (CurrentJob's host and password)
-// and waits, up to about ten seconds, for the copy to be there. False when it is not, or a value is refused,
-// or it has 1 MiB or more, of which no more is fetched. The caller removes the copy.
-bool fetch_daemon_config(const std::string &local_copy);
+struct FetchedConfig {
+    int exit_code; // of the command: what has come may do even when it is not 0
+    Refusal why;   // there is no copy: a value is refused, it has gone, or it has 1 MiB or more
+};
+
+// Fetches the remote host's "/etc/rsyncd.conf" over ssh into `local_copy` and waits, up to about ten seconds,
+// for the copy to be there. The caller removes the copy.
+FetchedConfig fetch_daemon_config(const RsyncJob &job, const std::string &local_copy);
+
+// What to say of an exit code.
+std::string not_fetched(int exit_code);
 
 } // namespace bakjob

@@ -17,28 +17,28 @@ constexpr const char *RSYNC = "/usr/sbin/rsync ";
 
 } // namespace
 
-std::optional<std::string> module_list_command(const RsyncJob &job)
+Checked module_list_command(const RsyncJob &job)
 {
-    if (!has_whole_texts(job)) return std::nullopt;
-    if (job.remote_ip[0] == '\0' || !is_safe_host(job.remote_ip)) return std::nullopt;
+    if (Refusal refusal = refusal_of_cut_text(job)) return refusal;
+    if (Refusal refusal = refusal_of_host(job.remote_ip)) return refusal;
     return format_text("%s -8%s %s:: 2>&1", RSYNC, ipv6_flag(job.remote_ip),
                        bracketed_host(job.remote_ip).c_str());
 }
 
-std::optional<std::string> write_test_command(const RsyncJob &job, int direction)
+Checked write_test_command(const RsyncJob &job, int direction)
 {
-    if (!has_whole_texts(job)) return std::nullopt;
-    if (job.remote_ip[0] == '\0' || !is_safe_host(job.remote_ip)) return std::nullopt;
-    if (!is_safe_rsync_user(job.rsync_user)) return std::nullopt;
-    const auto path = shell_path_part("remote_path", job.remote_path);
-    if (!path) return std::nullopt;
+    if (Refusal refusal = refusal_of_cut_text(job)) return refusal;
+    if (Refusal refusal = refusal_of_host(job.remote_ip)) return refusal;
+    if (Refusal refusal = refusal_of_rsync_user(job.rsync_user)) return refusal;
+    const Checked path = shell_path_part("remote_path", job.remote_path);
+    if (!path) return path;
 
     const bool daemon = job.rsync_mode == RSYNC_MODE_DAEMON;
     const bool pull = job.backup_type == BACKUP_PULL && direction == 0;
     std::string password;
     if (daemon) {
         const auto name = JobName::checked(job.job_name);
-        if (!name) return std::nullopt;
+        if (!name) return refused("job_name", "no run can have it");
         password = format_text("--password-file=%s ", in_double_quotes(password_file(*name)).c_str());
     }
     const std::string remote = format_text("%s@%s%s%s", job.rsync_user, bracketed_host(job.remote_ip).c_str(),
@@ -48,20 +48,28 @@ std::optional<std::string> write_test_command(const RsyncJob &job, int direction
                        ends.c_str());
 }
 
+ProbeReply probe_daemon(const RsyncJob &job)
+{
+    const Checked command = module_list_command(job);
+    if (command) DebugLog("rysnc test cmd--->[%s]\n", command->c_str());
+    return ask(command);
+}
+
+ProbeReply probe_target(const RsyncJob &job, int direction)
+{
+    const Checked command = write_test_command(job, direction);
+    if (command) DebugLog("rysnc write test cmd--->[%s]\n", command->c_str());
+    return ask(command);
+}
+
 RemoteReplyCode rsync_daemon_test()
 {
-    const auto command = module_list_command(CurrentJob);
-    if (!command) return REPLY_ERROR;
-    DebugLog("rysnc test cmd--->[%s]\n", command->c_str());
-    return rsync_classify_reply(*command);
+    return probe_daemon(CurrentJob).code;
 }
 
 RemoteReplyCode rsync_write_test(int direction)
 {
-    const auto command = write_test_command(CurrentJob, direction);
-    if (!command) return REPLY_ERROR;
-    DebugLog("rysnc write test cmd--->[%s]\n", command->c_str());
-    return rsync_classify_reply(*command);
+    return probe_target(CurrentJob, direction).code;
 }
 
 } // namespace bakjob

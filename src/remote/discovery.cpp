@@ -21,8 +21,8 @@ namespace bakjob
 namespace
 {
 
-constexpr int MOST_MODULES = 1024;
-constexpr int MOST_LINES = 4 * MOST_MODULES; // of a listing, which may never end
+constexpr int MAX_MODULES = 1024;
+constexpr int MAX_LINES = 4 * MAX_MODULES; // of a listing, which may never end
 
 void clear_list()
 {
@@ -64,8 +64,8 @@ void add_found_module(const std::string &name, const std::string &path)
     RemoteModule module{};
     if (!copy_text(module.name, name) || !copy_text(module.path, path)) {
         DebugLog("ERROR: remote module skipped: name or path too long\n");
-    } else if (module_list->count == MOST_MODULES) {
-        DebugLog("ERROR: remote module skipped: more than %d\n", MOST_MODULES);
+    } else if (module_list->count == MAX_MODULES) {
+        DebugLog("ERROR: remote module skipped: more than %d\n", MAX_MODULES);
     } else {
         copy_text(module.du_size, "0");
         rsync_add_module(module);
@@ -114,7 +114,7 @@ bool find_configured_modules()
 {
     // The copy has one name for all: another discovery must not take it away, nor be given ours.
     const UniqueFd lock = rsync_lock_config(DISCOVERY_LOCK_FILE);
-    if (!fetch_daemon_config(DISCOVERY_CONFIG_COPY)) return false;
+    if (fetch_daemon_config(CurrentJob, DISCOVERY_CONFIG_COPY).why) return false;
     const bool read = add_configured_modules(DISCOVERY_CONFIG_COPY);
     std::remove(DISCOVERY_CONFIG_COPY);
     sync();
@@ -148,7 +148,7 @@ int rsync_list_daemon_modules()
     ShellReader reply(*command);
     if (!reply.started()) return 0;
     std::string line;
-    for (int lines = 0; lines < MOST_LINES && reply.read_line(line); ++lines) {
+    for (int lines = 0; lines < MAX_LINES && reply.read_line(line); ++lines) {
         add_found_module(module_of_listing_line(line), "");
     }
     return reply.close();

@@ -44,16 +44,19 @@ RemoteReplyCode classify_reply_line(std::string_view line)
     return REPLY_OK;
 }
 
+ProbeReply ask(const Checked &command)
+{
+    if (!command) return {REPLY_ERROR, command.refusal().why};
+    if (!fits_command(*command)) return {REPLY_ERROR, refused("probe command", "too long").why};
+    const auto line = first_reply_line(*command);
+    if (!line) return {REPLY_ERROR, NOT_STARTED};
+    DebugLog("--->[%s]\n", line->c_str());
+    return {classify_reply_line(*line), *line};
+}
+
 RemoteReplyCode rsync_classify_reply(const std::string &command)
 {
-    if (!fits_command(command)) {
-        DebugLog("ERROR: probe command refused: too long\n");
-        return REPLY_ERROR;
-    }
-    const auto line = first_reply_line(command);
-    if (!line) return REPLY_ERROR;
-    DebugLog("--->[%s]\n", line->c_str());
-    return classify_reply_line(*line);
+    return ask(command).code;
 }
 
 } // namespace bakjob

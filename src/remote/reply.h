@@ -2,6 +2,8 @@
 
 // What the first line of a probe's output says about the remote side.
 
+#include "common/refusal.h"
+
 #include <cstdint>
 #include <string>
 #include <string_view>
@@ -25,8 +27,16 @@ enum RemoteReplyCode : std::int32_t {
 // The code of a first line, already without trailing white space.
 RemoteReplyCode classify_reply_line(std::string_view line);
 
+struct ProbeReply {
+    RemoteReplyCode code;
+    std::string line; // that told it, or why there was none
+};
+
 // Runs a probe command, which must send its errors into its output, to its end, and classifies the first
-// line.
+// line. A refused command is not run.
+ProbeReply ask(const Checked &command);
+
+// The code alone.
 RemoteReplyCode rsync_classify_reply(const std::string &command);
 
 } // namespace bakjob

@@ -12,6 +12,7 @@
 
 #include <cstring>
 #include <optional>
+#include <vector>
 
 namespace bakjob
 {
@@ -30,7 +31,7 @@ bool is_du_size(std::string_view text)
 
 // The first line that a remote command prints; of a refused one, the empty line. Nothing when it could not be
 // started.
-std::optional<std::string> reply_of(const std::optional<std::string> &command)
+std::optional<std::string> reply_of(const Checked &command)
 {
     return command ? first_line(*command) : std::string();
 }
@@ -51,10 +52,10 @@ std::string du_as_client(const RsyncJob &job, const std::string &folder)
     return format_text("du -sh %s%s%s 2>&1", link_local ? " " : "", folder.c_str(), link_local ? "" : " ");
 }
 
-std::optional<std::string> du_command(const RsyncJob &job, const std::string &folder)
+Checked du_command(const RsyncJob &job, const std::string &folder)
 {
     const auto login = ssh_login_of(job);
-    if (!login) return std::nullopt;
+    if (!login) return NO_SSH_LOGIN;
     return ssh_command(job, *login,
                        *login == SshLogin::as_client ? du_as_client(job, folder)
                                                      : "du -sh " + folder + " 2>&1");
@@ -107,11 +108,11 @@ void rsync_remote_free_space(SizeText (&free)[VOLUMES])
 {
     if (CurrentJob.remote_ip[0] == '\0') return;
     const auto login = ssh_login_of(CurrentJob);
-    std::optional<std::string> commands[VOLUMES];
+    std::vector<Checked> commands;
     for (int i = 0; i < VOLUMES; ++i) {
         const std::string remote = format_text("df -h | grep %s 2>&1", VOLUME_NAMES[i]);
-        if (login) commands[i] = ssh_command(CurrentJob, *login, remote);
-        DebugLog("--->[%s]\n", commands[i].value_or("").c_str());
+        commands.push_back(login ? ssh_command(CurrentJob, *login, remote) : NO_SSH_LOGIN);
+        DebugLog("--->[%s]\n", commands.back().value_or("").c_str());
     }
     for (int i = 0; i < VOLUMES; ++i) {
         const auto line = reply_of(commands[i]);
@@ -136,12 +137,12 @@ int rsync_remote_has_du(const std::string &command)
 void rsync_remote_du(const std::string &folder, SizeText &size)
 {
     if (CurrentJob.remote_ip[0] == '\0') return;
-    if (!is_plain_for_shells("remote folder", folder)) {
+    if (refusal_for_shells("remote folder", folder)) {
         copy_text(size, UNKNOWN);
         return;
     }
-    const auto escaped = shell_path("remote folder", folder);
-    const auto command = escaped ? du_command(CurrentJob, *escaped) : std::nullopt;
+    const Checked escaped = shell_path("remote folder", folder);
+    const Checked command = escaped ? du_command(CurrentJob, *escaped) : escaped;
     DebugLog("--->[%s]\n", command.value_or("").c_str());
     if (!command && ssh_login_of(CurrentJob)) copy_text(size, UNKNOWN); // refused
     const auto line = reply_of(command);

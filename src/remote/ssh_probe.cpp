@@ -3,6 +3,7 @@
 #include "common/address.h"
 #include "common/debug_log.h"
 #include "common/shell.h"
+#include "common/shell_text.h"
 #include "common/text.h"
 #include "config/current_job.h"
 
@@ -45,29 +46,35 @@ std::optional<SshTestResult> judge_ssh_reply(std::string_view line)
     return line.empty() ? SSH_FAILED : SSH_OK;
 }
 
-std::optional<std::string> ssh_test_command(const RsyncJob &job, SshLogin login)
+Checked ssh_test_command(const RsyncJob &job, SshLogin login)
 {
     return ssh_command(job, login, "ls / 2>&1");
 }
 
+LoginReply probe_login(const RsyncJob &job)
+{
+    if (job.remote_ip[0] == '\0') return {SSH_FAILED, refusal_of_host(job.remote_ip).why};
+    const auto login = ssh_login_of(job);
+    const Checked command = login ? ssh_test_command(job, *login) : NO_SSH_LOGIN;
+    DebugLog("ssh_test cmd[%s]\n", command.value_or("").c_str());
+    if (!command) return {SSH_FAILED, command.refusal().why};
+
+    auto line = first_reply_line(*command);
+    if (!line) return {SSH_FAILED, NOT_STARTED};
+    DebugLog("--->[%s]\n", line->c_str());
+    auto result = judge_ssh_reply(*line);
+    if (result) return {*result, *line};
+
+    forget_host_key(job.remote_ip);
+    line = first_reply_line(*command);
+    if (!line) return {SSH_FAILED, NOT_STARTED};
+    result = judge_ssh_reply(*line);
+    return {result.value_or(SSH_FAILED), *line};
+}
+
 SshTestResult ssh_test()
 {
-    if (CurrentJob.remote_ip[0] == '\0') return SSH_FAILED;
-    const auto login = ssh_login_of(CurrentJob);
-    const auto command = login ? ssh_test_command(CurrentJob, *login) : std::nullopt;
-    DebugLog("ssh_test cmd[%s]\n", command ? command->c_str() : "");
-    if (!command) return SSH_FAILED;
-
-    auto reply = first_reply_line(*command);
-    if (!reply) return SSH_FAILED;
-    DebugLog("--->[%s]\n", reply->c_str());
-    auto result = judge_ssh_reply(*reply);
-    if (result) return *result;
-
-    forget_host_key(CurrentJob.remote_ip);
-    reply = first_reply_line(*command);
-    result = reply ? judge_ssh_reply(*reply) : SSH_FAILED;
-    return result.value_or(SSH_FAILED);
+    return probe_login(CurrentJob).result;
 }
 
 } // namespace bakjob

@@ -22,12 +22,20 @@ enum SshTestResult : std::int32_t {
     SSH_TIMED_OUT = 7
 };
 
-// Tests the login of CurrentJob. When the host's key has changed, the stored key is removed and the login is
-// tried once more.
+struct LoginReply {
+    SshTestResult result;
+    std::string line; // that told it, or why there was none
+};
+
+// Tests the job's login. When the host's key has changed, the stored key is removed and the login is tried
+// once more.
+LoginReply probe_login(const RsyncJob &job);
+
+// The login of CurrentJob, the result alone.
 SshTestResult ssh_test();
 
-// The command of the test; nothing when a value is refused.
-std::optional<std::string> ssh_test_command(const RsyncJob &job, SshLogin login);
+// The command of the test.
+Checked ssh_test_command(const RsyncJob &job, SshLogin login);
 
 // What the first line of a login's reply means; nothing: the host's key has changed.
 std::optional<SshTestResult> judge_ssh_reply(std::string_view line);

@@ -12,20 +12,19 @@
 #include "remote/daemon_probe.h"
 #include "remote/remote_dir.h"
 #include "remote/ssh_probe.h"
+#include "transfer/plan.h"
 #include "transfer/row_guard.h"
-#include "transfer/rsync_command.h"
 #include "transfer/snapshot.h"
 #include "transfer/snapshot_mark.h"
 
+#include <array>
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
-#include <optional>
 #include <sys/select.h>
 #include <sys/stat.h>
 #include <unistd.h>
-#include <vector>
 
 namespace bakjob
 {
@@ -33,114 +32,211 @@ namespace bakjob
 namespace
 {
 
-constexpr int LOCAL_SIDE_REFUSED = -2; // no command ends so
-constexpr int RSYNC_PARTIAL = 23;      // some files could not be transferred: trying again does not help
+constexpr int RSYNC_PARTIAL = 23; // some files could not be transferred: trying again does not help
 
-bool is_recover_run()
+FolderOutcome failed(BackupResult result, const Reason &reason)
 {
-    return run_options.recover_seq != 0;
+    return {result, reason};
 }
 
-// Makes the folder that the write test missed, where that is possible. Whether the run may go on.
-bool prepare_missing_target(const JobName &job_name, const RsyncJob &job)
+// The reason of a refusal; none of an empty one.
+FolderOutcome judged(RunStep step, const Refusal &refusal)
 {
-    if (job.backup_type != BACKUP_PUSH) return false;
-    const std::string_view remote_path = job.remote_path;
-    const std::size_t slash = remote_path.find('/');
-    if (job.rsync_mode != RSYNC_MODE_DAEMON || slash == std::string_view::npos) return true;
-    const auto without_slash = [](const char *text) { return *text == '\0' ? text : text + 1; };
-    rsync_prepare_remote_dir(job_name, std::string(remote_path.substr(0, slash)),
-                             without_slash(share_remote_dir), without_slash(share_subdir));
-    return rsync_write_test(0) == REPLY_OK;
+    if (!refusal) return {BACKUP_DONE};
+    return failed(BACKUP_FAILED, {.step = step, .seen = refusal.why});
 }
 
-// Nothing when the remote side is ready for the transfer.
-std::optional<BackupResult> check_remote_side(const JobName &job_name, const RsyncJob &job)
+// Carries a plan out. A step's outcome is BACKUP_DONE when the next one may follow.
+class FolderRun
 {
-    if (is_recover_run()) {
-        if (rsync_write_test(1) != REPLY_OK) return BACKUP_RECOVER_FAILED;
-        return std::nullopt;
-    }
-    if (rsync_daemon_test() != REPLY_OK) return BACKUP_REMOTE_FAILED;
-    if (rsync_write_test(0) == REPLY_NO_DIR && !prepare_missing_target(job_name, job)) {
-        return BACKUP_REMOTE_FAILED;
-    }
-    return std::nullopt;
-}
+public:
+    FolderRun(const JobName &name, const RsyncJob &job) : name_(name), job_(job) {}
 
-std::string with_dump_size(const std::string &command)
-{
-    return command + " --dump-size ";
-}
+    FolderOutcome carry_out();
 
-std::string dry_run_of(const std::string &command)
-{
-    return with_dump_size(command) + " --dry-run >/dev/null 2>&1";
-}
+private:
+    FolderOutcome log_in();
+    FolderOutcome give_password();
+    FolderOutcome ask_daemon();
+    FolderOutcome reach_target();
+    FolderOutcome make_target(const ProbeReply &missing);
+    FolderOutcome check_command();
+    FolderOutcome move_snapshots_up();
+    FolderOutcome transfer();
+    FolderOutcome transfer_with_retries();
+    FolderOutcome transfer_once();
 
-// Where a run works on this device.
-struct LocalSide {
-    std::vector<std::string> folders; // whatever stands at their paths must be folders
-    std::string newest;               // snapshot that the transfer writes into; empty when it makes none
+    const JobName &name_;
+    const RsyncJob &job_;
+    TransferPlan plan_ = plan_transfer(job_, CurrentJob);
 };
 
-// Up to `retry` passes, at least one, each a dry run and, if that went well, the transfer. The exit code of
-// the last command, or LOCAL_SIDE_REFUSED.
-int transfer_with_retries(const JobName &job_name, const RsyncJob &job, const std::string &command,
-                          const LocalSide &local)
+FolderOutcome FolderRun::carry_out()
 {
-    const std::string dry_run = dry_run_of(command);
-    DebugLog("rsync_cmd = [%s]\n", dry_run.c_str());
-    int attempts_left = job.retry;
-    for (;;) {
-        if (!are_folders(local.folders)) return LOCAL_SIDE_REFUSED;
-        int code = exit_code(run_shell(dry_run));
-        if (code == 0 || code == RSYNC_PARTIAL) {
-            if (!are_folders(local.folders)) return LOCAL_SIDE_REFUSED;
-            if (!local.newest.empty() && !take_mark_away(local.newest)) return LOCAL_SIDE_REFUSED;
-            code = exit_code(run_shell(with_dump_size(command)));
-        } else {
-            std::remove(transfer_size_file(job_name).c_str());
+    struct Act {
+        RunStep step;
+        FolderOutcome (FolderRun::*function)();
+    };
+    constexpr std::array ACTS = {
+        Act{RunStep::LOGIN, &FolderRun::log_in},
+        Act{RunStep::PASSWORD, &FolderRun::give_password},
+        Act{RunStep::DAEMON, &FolderRun::ask_daemon},
+        Act{RunStep::TARGET, &FolderRun::reach_target},
+        Act{RunStep::COMMAND, &FolderRun::check_command},
+        Act{RunStep::SNAPSHOTS, &FolderRun::move_snapshots_up},
+        Act{RunStep::TRANSFER, &FolderRun::transfer},
+    };
+    FolderOutcome outcome = judged(RunStep::COMMAND, plan_.refusal);
+    if (outcome.result == BACKUP_DONE) outcome = judged(RunStep::FOLDER, refusal_of_row(plan_.row));
+    for (const RunStep step : plan_.steps) {
+        for (const Act &act : ACTS) {
+            if (act.step == step && outcome.result == BACKUP_DONE) outcome = (this->*act.function)();
         }
-        --attempts_left;
-        if (code == 0 || code == RSYNC_PARTIAL || attempts_left <= 0) return code;
-        select_sleep(job.retry_interval, 0);
     }
+    return outcome;
+}
+
+FolderOutcome FolderRun::log_in()
+{
+    const LoginReply reply = probe_login(CurrentJob);
+    if (reply.result == SSH_OK) return {BACKUP_DONE};
+    return failed(BACKUP_SSH_FAILED, {.step = RunStep::LOGIN, .seen = reply.line, .code = reply.result});
+}
+
+// Without its password file a daemon transfer could only fail, or worse, take somebody else's.
+FolderOutcome FolderRun::give_password()
+{
+    const Refusal refusal = write_password_file(CurrentJob);
+    return job_.rsync_mode == RSYNC_MODE_DAEMON ? judged(RunStep::PASSWORD, refusal)
+                                                : FolderOutcome{BACKUP_DONE};
+}
+
+FolderOutcome FolderRun::ask_daemon()
+{
+    const ProbeReply reply = probe_daemon(CurrentJob);
+    if (reply.code == REPLY_OK) return {BACKUP_DONE};
+    return failed(BACKUP_REMOTE_FAILED, {.step = RunStep::DAEMON, .seen = reply.line, .code = reply.code});
+}
+
+FolderOutcome FolderRun::reach_target()
+{
+    const ProbeReply reply = probe_target(CurrentJob, is_recover_run() ? 1 : 0);
+    const Reason reason{.step = RunStep::TARGET, .seen = reply.line, .code = reply.code};
+    if (is_recover_run() && reply.code != REPLY_OK) return failed(BACKUP_RECOVER_FAILED, reason);
+    if (is_recover_run() || reply.code != REPLY_NO_DIR) return {BACKUP_DONE};
+    if (job_.backup_type != BACKUP_PUSH) return failed(BACKUP_REMOTE_FAILED, reason);
+    return make_target(reply);
+}
+
+// Makes the folder that is missing, where that is possible.
+FolderOutcome FolderRun::make_target(const ProbeReply &missing)
+{
+    const std::string_view remote_path = job_.remote_path;
+    const std::size_t slash = remote_path.find('/');
+    if (job_.rsync_mode != RSYNC_MODE_DAEMON || slash == std::string_view::npos) return {BACKUP_DONE};
+    const auto without_slash = [](const char *text) { return *text == '\0' ? text : text + 1; };
+    const MadeFolder made = make_remote_folder(CurrentJob, name_, std::string(remote_path.substr(0, slash)),
+                                               without_slash(share_remote_dir), without_slash(share_subdir));
+    const ProbeReply reply = probe_target(CurrentJob, 0);
+    if (reply.code == REPLY_OK) return {BACKUP_DONE};
+    Reason reason{.step = RunStep::TARGET, .seen = reply.line, .code = reply.code};
+    if (made.why) reason.seen = missing.line + "; " + made.why.why;
+    if (!made.why) reason.exit_code = exit_code(made.status);
+    return failed(BACKUP_REMOTE_FAILED, reason);
+}
+
+FolderOutcome FolderRun::check_command()
+{
+    if (!plan_.command) return judged(RunStep::COMMAND, plan_.command.refusal());
+    // It names the contents of a folder, and those of one behind a link just as well.
+    const Place place = look_at(job_.local_path);
+    if (place.is_folder) plan_.row.emplace_back(job_.local_path);
+    std::remove(transfer_file(name_).c_str());
+    return judged(RunStep::FOLDER, place.refusal);
+}
+
+FolderOutcome FolderRun::move_snapshots_up()
+{
+    DebugLog("run rsync_snapshot_rotate() %s %d\n", job_.local_path, job_.inc_number);
+    if (const Refusal refusal = refusal_of_row(plan_.row)) return judged(RunStep::FOLDER, refusal);
+    copy_text(run_options.inc_root_path, plan_.newest);
+    return judged(RunStep::SNAPSHOTS, rotate(plan_rotation(job_.local_path, job_.inc_number, job_.job_name)));
+}
+
+FolderOutcome FolderRun::transfer()
+{
+    DebugLog("rsync_cmd = [%s]\n", plan_.command->c_str());
+    rsync_set_job_state(name_.text(), is_recover_run() ? JOB_RECOVER_RUNNING : JOB_RUNNING);
+    DebugLog("rsync_cmd = [%s]\n", dry_run_of(*plan_.command).c_str());
+    const FolderOutcome outcome = transfer_with_retries();
+    if (plan_.newest.empty()) return outcome;
+    DebugLog("inc_root_path = [%s]\n", plan_.newest.c_str());
+    if (const Refusal refusal = refusal_of_row(plan_.row)) return judged(RunStep::FOLDER, refusal);
+    utimensat(AT_FDCWD, plan_.newest.c_str(), nullptr, AT_SYMLINK_NOFOLLOW);
+    if (outcome.result == BACKUP_DONE) write_out_and_mark_whole(plan_.newest);
+    return outcome;
+}
+
+// Up to `retry` passes, at least one.
+FolderOutcome FolderRun::transfer_with_retries()
+{
+    for (int attempt = 1;; ++attempt) {
+        FolderOutcome outcome = transfer_once();
+        const Reason &reason = outcome.reason;
+        outcome.attempts = outcome.reason.attempt = attempt;
+        const bool again = (reason.step == RunStep::DRY_RUN || reason.step == RunStep::TRANSFER) &&
+                           reason.exit_code != RSYNC_PARTIAL && attempt < job_.retry;
+        if (!again) return outcome;
+        select_sleep(job_.retry_interval, 0);
+    }
+}
+
+// A dry run and, if that went well, the transfer.
+FolderOutcome FolderRun::transfer_once()
+{
+    if (const Refusal refusal = refusal_of_row(plan_.row)) return judged(RunStep::FOLDER, refusal);
+    const auto ended = [](RunStep step, int code) {
+        return failed(BACKUP_FAILED, {.step = step, .seen = code < 0 ? NOT_STARTED : "", .exit_code = code});
+    };
+    int code = exit_code(run_shell(dry_run_of(*plan_.command)));
+    if (code != 0 && code != RSYNC_PARTIAL) {
+        std::remove(transfer_size_file(name_).c_str());
+        return ended(RunStep::DRY_RUN, code);
+    }
+    if (const Refusal refusal = refusal_of_row(plan_.row)) return judged(RunStep::FOLDER, refusal);
+    if (!plan_.newest.empty()) {
+        if (const Refusal refusal = take_mark_away(plan_.newest)) return judged(RunStep::SNAPSHOTS, refusal);
+    }
+    code = exit_code(run_shell(with_dump_size(*plan_.command)));
+    return code == 0 ? FolderOutcome{BACKUP_DONE} : ended(RunStep::TRANSFER, code);
 }
 
 } // namespace
 
-std::optional<std::string> rsync_transfer_command(const RsyncJob &job)
+Refusal write_password_file(const RsyncJob &job)
 {
-    auto command = rsync_build_command(job);
-    if (command && !fits_command(dry_run_of(*command))) {
-        DebugLog("ERROR: transfer command refused: too long\n");
-        command.reset();
+    std::remove(job.rsync_pwd_file);
+    char password[PASSWORD_SIZE] = "";
+    const bool encoded = job.pwd_encoded != 0;
+    const bool wants_plain = job.server_type == SERVER_ANY;
+    int length = 0;
+    if (encoded && wants_plain) {
+        length = password_decode(password, job.rsync_pwd, sizeof password);
+    } else if (!encoded && !wants_plain) {
+        length = password_encode(password, job.rsync_pwd, sizeof password);
+    } else {
+        copy_text(password, job.rsync_pwd);
     }
-    return command;
+    if (length < 0) {
+        return refused("rsync_pwd", std::string("it has no ") + (wants_plain ? "plain" : "base64") + " form");
+    }
+    if (replace_file(job.rsync_pwd_file, 0600, std::string(password) + '\n')) return {};
+    return trace_refusal(std::string("rsync_pwd_file [") + job.rsync_pwd_file + "]: " + std::strerror(errno));
 }
 
 bool rsync_write_password_file()
 {
-    std::remove(CurrentJob.rsync_pwd_file);
-    char password[PASSWORD_SIZE] = "";
-    const bool encoded = CurrentJob.pwd_encoded != 0;
-    const bool wants_plain = CurrentJob.server_type == SERVER_ANY;
-    int length = 0;
-    if (encoded && wants_plain) {
-        length = password_decode(password, CurrentJob.rsync_pwd, sizeof password);
-    } else if (!encoded && !wants_plain) {
-        length = password_encode(password, CurrentJob.rsync_pwd, sizeof password);
-    } else {
-        copy_text(password, CurrentJob.rsync_pwd);
-    }
-    if (length < 0) {
-        DebugLog("ERROR: rsync_pwd refused: it has no %s form\n", wants_plain ? "plain" : "base64");
-        return false;
-    }
-    if (replace_file(CurrentJob.rsync_pwd_file, 0600, std::string(password) + '\n')) return true;
-    DebugLog("ERROR: rsync_pwd_file [%s]: %s\n", CurrentJob.rsync_pwd_file, std::strerror(errno));
-    return false;
+    return !write_password_file(CurrentJob);
 }
 
 int select_sleep(int seconds, int milliseconds)
@@ -151,44 +247,15 @@ int select_sleep(int seconds, int milliseconds)
     return result;
 }
 
-BackupResult rsync_run_backup(const JobName &job_name, RsyncJob &job)
+FolderOutcome transfer_folder(const JobName &job_name, RsyncJob &job)
 {
     rsync_prepare_current_job(job);
-    if (job.server_type != SERVER_SAME_KIND && job.server_type != SERVER_ANY) {
-        DebugLog("ERROR: server_type refused: %d\n", job.server_type);
-        return BACKUP_FAILED;
-    }
-    if (!has_whole_texts(job)) return BACKUP_FAILED;
-    LocalSide local{snapshots_in_use(job), ""};
-    if (!are_folders(local.folders)) return BACKUP_FAILED;
-    if (job.use_ssh == 1 && ssh_test() != SSH_OK) return BACKUP_SSH_FAILED;
-    // Without its password file a daemon transfer could only fail, or worse, take somebody else's.
-    if (!rsync_write_password_file() && job.rsync_mode == RSYNC_MODE_DAEMON) return BACKUP_FAILED;
-    if (const auto failure = check_remote_side(job_name, job)) return *failure;
+    return FolderRun(job_name, job).carry_out();
+}
 
-    // The command names the contents of a folder, and those of one behind a link just as well.
-    const auto names_folder = is_folder(job.local_path);
-    if (!names_folder) return BACKUP_FAILED;
-    if (*names_folder) local.folders.emplace_back(job.local_path);
-    const auto command = rsync_transfer_command(job);
-    if (!command) return BACKUP_FAILED;
-    std::remove(transfer_file(job_name).c_str());
-    if (keeps_snapshots(job)) {
-        DebugLog("run rsync_snapshot_rotate() %s %d\n", job.local_path, job.inc_number);
-        if (!are_folders(local.folders)) return BACKUP_FAILED;
-        if (!rsync_snapshot_rotate(job.local_path, job.inc_number, job.job_name)) return BACKUP_FAILED;
-        local.newest = snapshot_path(job.local_path, job.job_name, 0);
-    }
-    DebugLog("rsync_cmd = [%s]\n", command->c_str());
-    rsync_set_job_state(job_name.text(), is_recover_run() ? JOB_RECOVER_RUNNING : JOB_RUNNING);
-    const int code = transfer_with_retries(job_name, job, *command, local);
-    if (!local.newest.empty()) {
-        DebugLog("inc_root_path = [%s]\n", run_options.inc_root_path);
-        if (!are_folders(local.folders)) return BACKUP_FAILED;
-        utimensat(AT_FDCWD, run_options.inc_root_path, nullptr, AT_SYMLINK_NOFOLLOW);
-        if (code == 0) write_out_and_mark_whole(local.newest);
-    }
-    return code == 0 ? BACKUP_DONE : BACKUP_FAILED;
+BackupResult rsync_run_backup(const JobName &job_name, RsyncJob &job)
+{
+    return transfer_folder(job_name, job).result;
 }
 
 } // namespace bakjob

@@ -1,10 +1,8 @@
 #include "transfer/row_guard.h"
 
-#include "common/debug_log.h"
 #include "common/job_files.h"
 #include "common/run_options.h"
 
-#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <optional>
@@ -27,22 +25,22 @@ std::optional<mode_t> type_at(const std::string &path)
     return std::nullopt;
 }
 
-void refuse(const std::string &path, const std::string &why)
+Refusal refusal_at(const std::string &path, const std::string &why)
 {
-    DebugLog("ERROR: local_path refused: [%s] %s\n", path.c_str(), why.c_str());
+    return refused("local_path", '[' + path + "] " + why);
 }
 
 } // namespace
 
 bool keeps_snapshots(const RsyncJob &job)
 {
-    return job.inc_enable == 1 && run_options.recover_seq == 0 && job.backup_type == BACKUP_PULL;
+    return job.inc_enable == 1 && !is_recover_run() && job.backup_type == BACKUP_PULL;
 }
 
 std::vector<std::string> snapshots_in_use(const RsyncJob &job)
 {
     std::vector<std::string> paths;
-    if (run_options.recover_seq != 0) {
+    if (is_recover_run()) {
         paths.push_back(
             snapshot_path(job.local_path, job.job_name, std::int64_t{run_options.recover_seq} - 1));
     }
@@ -60,20 +58,19 @@ std::string why_no_folder(const std::string &path)
     return *type == S_IFLNK ? "is a link" : "is no folder";
 }
 
-std::optional<bool> is_folder(const std::string &path)
+Place look_at(const std::string &path)
 {
-    if (const auto type = type_at(path)) return *type == S_IFDIR;
-    refuse(path, why_no_folder(path));
-    return std::nullopt;
+    if (const auto type = type_at(path)) return {*type == S_IFDIR, {}};
+    return {false, refusal_at(path, why_no_folder(path))};
 }
 
-bool are_folders(const std::vector<std::string> &paths)
+Refusal refusal_of_row(const std::vector<std::string> &paths)
 {
-    return std::all_of(paths.begin(), paths.end(), [](const std::string &path) {
+    for (const std::string &path : paths) {
         const std::string fault = why_no_folder(path);
-        if (!fault.empty()) refuse(path, fault);
-        return fault.empty();
-    });
+        if (!fault.empty()) return refusal_at(path, fault);
+    }
+    return {};
 }
 
 } // namespace bakjob

@@ -3,9 +3,9 @@
 // What commands that run as root must not find in a job's folder: users of the share may put a link there,
 // and the files behind it would be sent, moved or deleted.
 
+#include "common/refusal.h"
 #include "config/job.h"
 
-#include <optional>
 #include <string>
 #include <vector>
 
@@ -22,11 +22,15 @@ std::vector<std::string> snapshots_in_use(const RsyncJob &job);
 // What is wrong with a path at which a folder must stand, or nothing; empty when that is so.
 std::string why_no_folder(const std::string &path);
 
-// Whether a folder stands there. Nothing, with a trace, when that cannot be told: one that passes for a file
-// would be copied to another place.
-std::optional<bool> is_folder(const std::string &path);
+// What stands at a path. Refused when that cannot be told: a folder that passes for a file would be copied to
+// another place.
+struct Place {
+    bool is_folder;
+    Refusal refusal;
+};
+Place look_at(const std::string &path);
 
-// False, with a trace that names it, when one of the paths is not so.
-bool are_folders(const std::vector<std::string> &paths);
+// Names the first path at which something else than a folder stands.
+Refusal refusal_of_row(const std::vector<std::string> &paths);
 
 } // namespace bakjob

@@ -67,13 +67,12 @@ bool write_out_and_mark_whole(const std::string &snapshot)
     return mark(snapshot, true);
 }
 
-bool take_mark_away(const std::string &snapshot)
+Refusal take_mark_away(const std::string &snapshot)
 {
-    if (lremovexattr(snapshot.c_str(), SNAPSHOT_MARK) == 0) return true;
+    if (lremovexattr(snapshot.c_str(), SNAPSHOT_MARK) == 0) return {};
     const int why = errno;
-    if (why == ENODATA || why == ENOENT || !has_any_mark(snapshot)) return true;
-    DebugLog("ERROR: snapshot [%s] still marked as complete: %s\n", snapshot.c_str(), std::strerror(why));
-    return false;
+    if (why == ENODATA || why == ENOENT || !has_any_mark(snapshot)) return {};
+    return trace_refusal("snapshot [" + snapshot + "] still marked as complete: " + std::strerror(why));
 }
 
 } // namespace bakjob

@@ -4,6 +4,8 @@
 // set. It holds the folder's name, so a copy that takes it along, of whatever part of the files, is not
 // marked by it. A file system without extended attributes keeps none: there nothing is known to be whole.
 
+#include "common/refusal.h"
+
 #include <string>
 
 namespace bakjob
@@ -24,7 +26,7 @@ bool mark_whole(const std::string &snapshot);
 // folder with empty files.
 bool write_out_and_mark_whole(const std::string &snapshot);
 
-// Takes the mark away, whatever it says. False, with a trace, when it is still there.
-bool take_mark_away(const std::string &snapshot);
+// Takes the mark away, whatever it says. A refusal when it is still there.
+Refusal take_mark_away(const std::string &snapshot);
 
 } // namespace bakjob

@@ -1,0 +1,33 @@
+#pragma once
+
+// What the transfer of one folder takes: made before anything is done, so that it can be looked at, and then
+// carried out by backup.h.
+
+#include "common/reason.h"
+#include "common/refusal.h"
+#include "config/job.h"
+
+#include <string>
+#include <vector>
+
+namespace bakjob
+{
+
+struct TransferPlan {
+    Refusal refusal;              // no run takes such a job
+    std::vector<RunStep> steps;   // in this order; the first that fails ends it
+    std::vector<std::string> row; // nothing but folders may stand at these paths
+    Checked command;              // of the transfer
+    std::string newest;           // snapshot that the transfer writes into; empty: none
+
+    [[nodiscard]] bool has(RunStep step) const;
+};
+
+// For a job with one folder, and the same job with its defaults. Looks at the folder, asks nobody.
+TransferPlan plan_transfer(const RsyncJob &job, const RsyncJob &filled);
+
+// The two forms in which the command is run, its dry run first.
+std::string dry_run_of(const std::string &command);
+std::string with_dump_size(const std::string &command);
+
+} // namespace bakjob
