@@ -22,7 +22,7 @@ namespace
 bool is_measured(const SizeText &size)
 {
     const std::string_view text = size;
-    return !text.empty() && text != "N/A";
+    return !text.empty() && text != UNKNOWN_SIZE;
 }
 
 // Nobody has measured the folder of a module that is only known by its name.

@@ -1,6 +1,7 @@
 #include "cli/local_paths.h"
 
 #include "common/handles.h"
+#include "common/job_files.h"
 #include "common/private_file.h"
 #include "common/shell.h"
 #include "common/shell_text.h"
@@ -16,9 +17,7 @@ namespace
 {
 
 constexpr const char *SHARED_NAMES = "/etc/shared_name";
-constexpr std::string_view VOLUMES_FOLDER = "/mnt/HD/";
-constexpr std::size_t VOLUME_LENGTH = 5;
-constexpr std::size_t MOST_NAME = 63;
+constexpr std::size_t MAX_NAME = 63;
 
 // The first line that holds the text. Of a line only so many bytes are looked at; the rest is another line.
 std::optional<std::string> line_holding(std::string_view text, std::size_t line_length)
@@ -82,7 +81,7 @@ const char *rsync_shared_path(const std::string &path)
 std::string shared_name_of_line(std::string_view line)
 {
     const std::string_view word = next_word(line);
-    return word.size() > MOST_NAME ? std::string() : std::string(word);
+    return word.size() > MAX_NAME ? std::string() : std::string(word);
 }
 
 } // namespace bakjob

@@ -31,7 +31,7 @@ namespace
 {
 
 constexpr int ALERT_LEVEL = 1;
-constexpr std::size_t VOLUME_PREFIX_LENGTH = 14; // of "/mnt/HD/HD_a2/"
+constexpr std::size_t VOLUME_PREFIX_LENGTH = VOLUMES_FOLDER.size() + VOLUME_LENGTH + 1; // with a slash
 
 std::optional<RsyncJob> load_enabled_job(const JobName &name)
 {
@@ -121,6 +121,7 @@ std::vector<FolderOutcome> run_folders(const RsyncJob &job, const JobName &name)
     FolderTable folders{};
     rsync_split_folders(to_split, folders);
     std::vector<FolderOutcome> outcomes;
+    outcomes.reserve(FolderTable::SIZE + 1);
     for (int i = 0; i < folders.count; ++i) {
         outcomes.push_back(run_folder(job, name, root, {folders.entries[i], i + 1, folders.count}));
     }

@@ -61,6 +61,12 @@ std::string bracketed_host(const std::string &address)
     return ip_address_kind(address) == ADDRESS_IPV4 ? address : '[' + scoped_host(address) + ']';
 }
 
+std::string rsync_address(const char *user, const std::string &host, Reached how)
+{
+    const std::string login = user == nullptr ? "" : std::string(user) + '@';
+    return login + bracketed_host(host) + (how == Reached::BY_DAEMON ? "::" : ":");
+}
+
 const char *ipv6_flag(std::string_view address)
 {
     return ip_address_kind(address) == ADDRESS_IPV4 ? "" : "6";

@@ -27,6 +27,11 @@ std::string scoped_host(const std::string &address);
 // The same in square brackets unless it is of kind ADDRESS_IPV4: the form that rsync takes.
 std::string bracketed_host(const std::string &address);
 
+// What stands in front of a remote path: "USER@HOST::" for a daemon, "USER@HOST:" over ssh; without `user`
+// (null), the host and its colons.
+enum class Reached { BY_DAEMON, OVER_SSH };
+std::string rsync_address(const char *user, const std::string &host, Reached how);
+
 // The flag that IPv6 hosts need behind other rsync flags: "6" or nothing.
 const char *ipv6_flag(std::string_view address);
 

@@ -16,6 +16,9 @@ inline constexpr const char *CONFIG_FILE = "/etc/NAS_CFG/config.xml";
 inline constexpr const char *CONFIG_LOCK_FILE = "/tmp/rsync_write_conf.lock";
 // Locked by whoever replaces what stands at a lock's name (config/config_lock.h).
 inline constexpr const char *LOCK_GUARD_FILE = "/var/run/bakjob_lock.guard";
+// Volumes are mounted below it, under names of five characters: "HD_a2" and so on.
+inline constexpr std::string_view VOLUMES_FOLDER = "/mnt/HD/";
+inline constexpr std::size_t VOLUME_LENGTH = 5;
 inline constexpr const char *SERIAL_FILE = "/tmp/kv_serial.txt";
 inline constexpr const char *TRACE_FILE = "/tmp/rsync_debug";
 

@@ -33,7 +33,7 @@ Refusal refusal_of_word(const char *field, std::string_view text)
 // characters that end a name of this kind within rsync's or ssh's own argument.
 Refusal refusal_of_name(const char *field, std::string_view name, std::string_view ending)
 {
-    if (const Refusal refusal = refusal_of_word(field, name)) return refusal;
+    if (Refusal refusal = refusal_of_word(field, name)) return refusal;
     if (holds_any(name, SHELL_SPECIAL) || holds_any(name, "#!~")) return refused(field, SPECIAL);
     if (holds_any(name, ending)) return refused(field, "character that ends a name");
     return {};
@@ -80,7 +80,7 @@ Checked shell_path_part(const char *field, std::string_view path)
 
 Refusal refusal_for_shells(const char *field, std::string_view path)
 {
-    if (const Refusal refusal = refusal_of_word(field, path)) return refusal;
+    if (Refusal refusal = refusal_of_word(field, path)) return refusal;
     const bool special = holds_any(path, SHELL_SPECIAL) || holds_any(path.substr(0, 1), SPECIAL_IN_FRONT) ||
                          is_special_inside(path);
     return special ? refused(field, SPECIAL) : Refusal();

@@ -10,8 +10,9 @@
 namespace bakjob
 {
 
-// A size as df and du print it for people, such as "1.8T" or "4.0K"; "N/A" when it cannot be had.
+// A size as df and du print it for people, such as "1.8T" or "4.0K".
 using SizeText = char[32];
+inline constexpr const char *UNKNOWN_SIZE = "N/A";
 
 inline constexpr int VOLUMES = 4;
 inline constexpr const char *VOLUME_NAMES[VOLUMES] = {"HD_a2", "HD_b2", "HD_c2", "HD_d2"};

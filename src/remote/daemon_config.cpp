@@ -77,7 +77,7 @@ Refusal refusal_of_size(const std::string &local_copy)
 {
     struct stat status = {};
     if (lstat(local_copy.c_str(), &status) != 0 || status.st_size < MAX_BYTES) return {};
-    const Refusal refusal = refused('[' + local_copy + ']', "larger than 1 MiB");
+    Refusal refusal = refused('[' + local_copy + ']', "larger than 1 MiB");
     std::remove(local_copy.c_str());
     return refusal;
 }

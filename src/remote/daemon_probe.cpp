@@ -21,8 +21,8 @@ Checked module_list_command(const RsyncJob &job)
 {
     if (Refusal refusal = refusal_of_cut_text(job)) return refusal;
     if (Refusal refusal = refusal_of_host(job.remote_ip)) return refusal;
-    return format_text("%s -8%s %s:: 2>&1", RSYNC, ipv6_flag(job.remote_ip),
-                       bracketed_host(job.remote_ip).c_str());
+    return format_text("%s -8%s %s 2>&1", RSYNC, ipv6_flag(job.remote_ip),
+                       rsync_address(nullptr, job.remote_ip, Reached::BY_DAEMON).c_str());
 }
 
 Checked write_test_command(const RsyncJob &job, int direction)
@@ -31,7 +31,7 @@ Checked write_test_command(const RsyncJob &job, int direction)
     if (Refusal refusal = refusal_of_host(job.remote_ip)) return refusal;
     if (Refusal refusal = refusal_of_rsync_user(job.rsync_user)) return refusal;
     const Checked path = shell_path_part("remote_path", job.remote_path);
-    if (!path) return path;
+    if (!path) return path.refusal();
 
     const bool daemon = job.rsync_mode == RSYNC_MODE_DAEMON;
     const bool pull = job.backup_type == BACKUP_PULL && direction == 0;
@@ -41,8 +41,8 @@ Checked write_test_command(const RsyncJob &job, int direction)
         if (!name) return refused("job_name", "no run can have it");
         password = format_text("--password-file=%s ", in_double_quotes(password_file(*name)).c_str());
     }
-    const std::string remote = format_text("%s@%s%s%s", job.rsync_user, bracketed_host(job.remote_ip).c_str(),
-                                           daemon ? "::" : ":", path->c_str());
+    const Reached how = daemon ? Reached::BY_DAEMON : Reached::OVER_SSH;
+    const std::string remote = rsync_address(job.rsync_user, job.remote_ip, how) + *path;
     const std::string ends = pull ? remote + " /tmp" : (daemon ? "'/etc/hosts' " : "/etc/hosts ") + remote;
     return format_text("%s -a8%s --dry-run %s%s 2>&1", RSYNC, ipv6_flag(job.remote_ip), password.c_str(),
                        ends.c_str());

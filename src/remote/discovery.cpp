@@ -44,13 +44,13 @@ void measure_remote_side()
 void measure_this_device()
 {
     for (int i = 0; i < VOLUMES; ++i) {
-        const std::string mount_point = std::string("/mnt/HD/") + VOLUME_NAMES[i];
+        const std::string mount_point = std::string(VOLUMES_FOLDER) + VOLUME_NAMES[i];
         if (access(mount_point.c_str(), F_OK) == 0) {
             rsync_local_free_space(VOLUME_NAMES[i], module_list->local_free[i]);
         }
     }
     if (was_cut(CurrentJob, "local_path")) {
-        copy_text(module_list->local_size, "N/A");
+        copy_text(module_list->local_size, UNKNOWN_SIZE);
         return;
     }
     std::string folders = CurrentJob.local_path; // is split in place

@@ -21,7 +21,6 @@ namespace
 {
 
 constexpr std::size_t LOCAL_COMMAND_SIZE = 4648;
-constexpr const char *UNKNOWN = "N/A";
 
 bool is_du_size(std::string_view text)
 {
@@ -85,19 +84,19 @@ void size_of_df_line(std::string_view line, SizeText &size)
         next_word(line);
     }
     const std::string_view word = next_word(line);
-    if (word.empty() || !copy_text(size, word)) copy_text(size, UNKNOWN);
+    if (word.empty() || !copy_text(size, word)) copy_text(size, UNKNOWN_SIZE);
 }
 
 void size_of_du_reply(std::string_view line, SizeText &size)
 {
     const std::string_view word = next_word(line);
-    if (!word.empty() && !copy_text(size, word)) copy_text(size, UNKNOWN);
-    if (!is_du_size(size)) copy_text(size, UNKNOWN);
+    if (!word.empty() && !copy_text(size, word)) copy_text(size, UNKNOWN_SIZE);
+    if (!is_du_size(size)) copy_text(size, UNKNOWN_SIZE);
 }
 
 void rsync_local_free_space(const std::string &volume, SizeText &free)
 {
-    copy_text(free, UNKNOWN);
+    copy_text(free, UNKNOWN_SIZE);
     const auto word = shell_path("volume", volume);
     if (!word) return;
     const auto line = first_line(format_text("df -h | grep %s 2>&1", word->c_str()));
@@ -138,13 +137,13 @@ void rsync_remote_du(const std::string &folder, SizeText &size)
 {
     if (CurrentJob.remote_ip[0] == '\0') return;
     if (refusal_for_shells("remote folder", folder)) {
-        copy_text(size, UNKNOWN);
+        copy_text(size, UNKNOWN_SIZE);
         return;
     }
     const Checked escaped = shell_path("remote folder", folder);
     const Checked command = escaped ? du_command(CurrentJob, *escaped) : escaped;
     DebugLog("--->[%s]\n", command.value_or("").c_str());
-    if (!command && ssh_login_of(CurrentJob)) copy_text(size, UNKNOWN); // refused
+    if (!command && ssh_login_of(CurrentJob)) copy_text(size, UNKNOWN_SIZE); // refused
     const auto line = reply_of(command);
     if (line) size_of_du_reply(*line, size);
 }
@@ -153,7 +152,7 @@ void rsync_local_du(char *folders, SizeText &size)
 {
     const auto command = local_du_command(folders);
     if (!command) {
-        copy_text(size, UNKNOWN);
+        copy_text(size, UNKNOWN_SIZE);
         return;
     }
     ShellReader reply(*command);

@@ -33,7 +33,7 @@ Checked ssh_command(const RsyncJob &job, SshLogin login, std::string_view remote
 {
     const Checked password = ssh_password(job);
     if (Refusal refusal = refusal_of_cut_text(job)) return refusal;
-    if (!password) return password;
+    if (!password) return password.refusal();
     if (Refusal refusal = refusal_of_host(job.remote_ip)) return refusal;
     const std::string option = password->empty() ? "" : format_text("-d '%s'", password->c_str());
     const std::string six = *ipv6_flag(job.remote_ip) == '\0' ? "" : "-6 ";

@@ -168,7 +168,7 @@ FolderOutcome FolderRun::transfer()
     DebugLog("rsync_cmd = [%s]\n", plan_.command->c_str());
     rsync_set_job_state(name_.text(), is_recover_run() ? JOB_RECOVER_RUNNING : JOB_RUNNING);
     DebugLog("rsync_cmd = [%s]\n", dry_run_of(*plan_.command).c_str());
-    const FolderOutcome outcome = transfer_with_retries();
+    FolderOutcome outcome = transfer_with_retries();
     if (plan_.newest.empty()) return outcome;
     DebugLog("inc_root_path = [%s]\n", plan_.newest.c_str());
     if (const Refusal refusal = refusal_of_row(plan_.row)) return judged(RunStep::FOLDER, refusal);

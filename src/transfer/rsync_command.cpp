@@ -34,7 +34,7 @@ Refusal refusal_of_values(const RsyncJob &job, bool named)
 Checked remote_shell(const RsyncJob &job, const RsyncJob &filled)
 {
     const Checked password = ssh_password(job);
-    if (!password) return password;
+    if (!password) return password.refusal();
     const bool with_password = filled.ssh_pwd[0] != '\0';
     const std::string option = with_password ? format_text("-d \"%s\" ", password->c_str()) : "";
     if (filled.server_type == SERVER_SAME_KIND) {
@@ -61,7 +61,7 @@ Checked options(const RsyncJob &job, const RsyncJob &filled)
                                    ipv6_flag(job.remote_ip));
     if (job.use_ssh == 1) {
         const Checked shell = remote_shell(job, filled);
-        if (!shell) return shell;
+        if (!shell) return shell.refusal();
         text += *shell;
     }
     text += deletion(job.keep_exist_file);
@@ -69,7 +69,7 @@ Checked options(const RsyncJob &job, const RsyncJob &filled)
     text += exclude_options(ExcludeForm::TRANSFER);
     if (job.rsync_mode == RSYNC_MODE_DAEMON) {
         const Checked file = shell_path("rsync_pwd_file", job.rsync_pwd_file);
-        if (!file) return file;
+        if (!file) return file.refusal();
         text += " --password-file=" + in_double_quotes(job.rsync_pwd_file);
     }
     if (std::string(DEFAULT_PORT) != job.port) text += format_text(" --port=%s", job.port);
@@ -79,9 +79,8 @@ Checked options(const RsyncJob &job, const RsyncJob &filled)
 // User, host and the colons: everything in front of the remote path.
 std::string endpoint(const RsyncJob &job, bool named)
 {
-    const std::string host = bracketed_host(job.remote_ip);
-    if (job.rsync_mode != RSYNC_MODE_DAEMON) return host + ':';
-    return std::string(named ? job.rsync_user : "root") + '@' + host + "::";
+    if (job.rsync_mode != RSYNC_MODE_DAEMON) return rsync_address(nullptr, job.remote_ip, Reached::OVER_SSH);
+    return rsync_address(named ? job.rsync_user : "root", job.remote_ip, Reached::BY_DAEMON);
 }
 
 } // namespace
@@ -91,9 +90,9 @@ Checked transfer_command(const RsyncJob &job, const RsyncJob &filled)
     const bool named = filled.server_type != SERVER_SAME_KIND;
     if (Refusal refusal = refusal_of_values(job, named)) return refusal;
     const Checked option_text = options(job, filled);
-    if (!option_text) return option_text;
+    if (!option_text) return option_text.refusal();
     const Checked remote_path = shell_path_part("remote_path", job.remote_path);
-    if (!remote_path) return remote_path;
+    if (!remote_path) return remote_path.refusal();
 
     // Only a directory, not a link to one, is copied by its contents.
     const Place place = look_at(job.local_path);
@@ -109,7 +108,7 @@ Checked transfer_command(const RsyncJob &job, const RsyncJob &filled)
         local = snapshot_path(job.local_path, job.job_name, 0);
     }
     const Checked local_end = shell_path("local_path", local);
-    if (!local_end) return local_end;
+    if (!local_end) return local_end.refusal();
     const std::string remote_end = endpoint(job, named) + *remote_path + (pull ? slash : "");
     if (option_text->size() >= COMMAND_SIZE || remote_end.size() >= PATH_SIZE) {
         return refused("transfer command", "too long");
