@@ -91,6 +91,7 @@ int act(const CLI::App &app, Request &request)
 int run(int argc, char **argv)
 {
     CLI::App app("Manages backup jobs. bakjob runs them.", "bakjobctl");
+    app.set_version_flag("--version", "bakjobctl " BAKJOB_VERSION);
     app.require_subcommand(1);
     Request request;
     for (const Command &command : COMMANDS) {

@@ -5,15 +5,15 @@
 // lists the jobs, adds one that backs SHARE up to HOST, reads it back, asks what the remote side offers, and
 // deletes the job again. SSH_PASSWORD is base64 text.
 
-#include "common/job_files.h"
-#include "common/text.h"
-#include "config/config_lock.h"
-#include "config/current_job.h"
-#include "config/job_list.h"
-#include "config/job_operations.h"
-#include "config/job_store.h"
-#include "config/remote_modules.h"
-#include "remote/discovery.h"
+#include <bakjob/common/fixed_text.h>
+#include <bakjob/common/job_files.h>
+#include <bakjob/config/config_lock.h>
+#include <bakjob/config/current_job.h>
+#include <bakjob/config/job_list.h>
+#include <bakjob/config/job_operations.h>
+#include <bakjob/config/job_store.h>
+#include <bakjob/config/remote_modules.h>
+#include <bakjob/remote/discovery.h>
 
 #include <cstdio>
 

@@ -43,5 +43,5 @@ TEST_F(Completion, KnowsEveryCommand)
     const std::string commands =
         shell("bakjobctl --help | sed -n '/^Subcommands:/,$ s/^  \\([a-z]*\\)  *.*/\\1/p'").output;
     EXPECT_GT(lines_of(commands).size(), 10U) << commands;
-    EXPECT_EQ(offered("''"), commands + "--help\n");
+    EXPECT_EQ(offered("''"), commands + "--help\n--version\n");
 }

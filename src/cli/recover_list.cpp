@@ -3,6 +3,7 @@
 #include "common/debug_log.h"
 #include "common/job_files.h"
 #include "common/run_options.h"
+#include "common/text.h"
 #include "config/config_lock.h"
 #include "config/job_list.h"
 #include "config/job_store.h"

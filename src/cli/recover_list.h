@@ -2,7 +2,7 @@
 
 // The snapshots of an incremental job, as a recover run numbers them: from 1 in the order of their names.
 
-#include "common/text.h"
+#include "common/fixed_text.h"
 #include "config/job.h"
 
 #include <cstdint>

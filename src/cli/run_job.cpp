@@ -8,6 +8,7 @@
 #include "common/interrupt.h"
 #include "common/job_files.h"
 #include "common/run_options.h"
+#include "common/text.h"
 #include "config/job_list.h"
 #include "config/job_state.h"
 #include "config/job_store.h"

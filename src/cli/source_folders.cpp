@@ -5,6 +5,7 @@
 #include "common/job_files.h"
 #include "common/private_file.h"
 #include "common/run_options.h"
+#include "common/text.h"
 #include "config/current_job.h"
 #include "platform/device.h"
 

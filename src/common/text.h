@@ -1,7 +1,9 @@
 #pragma once
 
-// Small text routines: bounded copies into record fields, formatting, trimming, and the escape rule for
-// paths. The rules about what may go into a command at all are in shell_text.h.
+// Small text routines: formatting, reading, trimming, and the escape rule for paths. The rules about what may
+// go into a command at all are in shell_text.h.
+
+#include "common/fixed_text.h"
 
 #include <cstdarg>
 #include <cstddef>
@@ -12,18 +14,6 @@
 
 namespace bakjob
 {
-
-inline constexpr std::size_t PATH_SIZE = 1024; // bytes of a path buffer, terminator included
-
-// Copies `source` into the field as a terminated text. A text that does not fit, or holds a zero byte, is
-// refused: false, and the field is as it was.
-bool copy_text(char *field, std::size_t size, std::string_view source);
-
-template <std::size_t N>
-bool copy_text(char (&field)[N], std::string_view source)
-{
-    return copy_text(field, N, source);
-}
 
 // printf into a string of whatever length it takes.
 [[gnu::format(printf, 1, 2)]] std::string format_text(const char *format, ...);
@@ -63,8 +53,3 @@ void trim_right(std::string &text);
 std::string escape_path(std::string_view path);
 
 } // namespace bakjob
-
-// escape_path in place, for users outside the module. `text` must have room for PATH_SIZE bytes; an escaped
-// text that would not fit ends before the first character that does not. Null, and the text untouched, when
-// nothing needs an escape; else `text`.
-extern "C" char *fix_path_special_char(char *text);

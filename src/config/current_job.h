@@ -2,7 +2,7 @@
 
 // The folder being transferred: its job, with its defaults filled in, and its place in a network share.
 
-#include "common/text.h"
+#include "common/fixed_text.h"
 #include "config/job.h"
 
 namespace bakjob
