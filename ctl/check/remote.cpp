@@ -33,45 +33,44 @@ bool is_measured(const RemoteModule &module)
 
 // A daemon lists its modules to everybody; where they lie and how large they are takes a login, as jobs for
 // an appliance of the same kind use it. False when it is not let in.
-bool measure_modules()
+bool measure_modules(RsyncJob job)
 {
-    const bool let_in = try_login(CurrentJob, SshLogin::as_client).result == SSH_OK;
+    const bool let_in = try_login(job, SshLogin::as_client).result == SSH_OK;
     if (let_in) {
-        CurrentJob.server_type = SERVER_SAME_KIND;
-        rsync_discover_remote();
+        job.server_type = SERVER_SAME_KIND;
+        discover_remote(job);
     }
-    if (!let_in || rsync_module_list_empty() == 1) rsync_list_daemon_modules();
+    if (!let_in || rsync_module_list_empty() == 1) list_daemon_modules(job);
     if (!let_in) return false;
     // Each direction asks for what it needs alone.
-    if (CurrentJob.backup_type == BACKUP_PULL) {
-        rsync_remote_free_space(module_list->remote_free);
+    if (job.backup_type == BACKUP_PULL) {
+        measure_remote_free_space(job, module_list->remote_free);
         return true;
     }
     for (RemoteModule *module = module_list->head; module != nullptr; module = module->next) {
-        if (*module->path != '\0') rsync_remote_du(module->path, module->du_size);
+        if (*module->path != '\0') measure_remote_folder(job, module->path, module->du_size);
     }
     return true;
 }
 
-bool measure_path()
+bool measure_path(const RsyncJob &job)
 {
-    rsync_list_daemon_modules();
-    const auto login = ssh_login_of(CurrentJob);
-    if (!login || try_login(CurrentJob, *login).result != SSH_OK) return false;
-    rsync_remote_du(CurrentJob.remote_path, module_list->remote_size);
-    rsync_remote_free_space(module_list->remote_free);
+    list_daemon_modules(job);
+    const auto login = ssh_login_of(job);
+    if (!login || try_login(job, *login).result != SSH_OK) return false;
+    measure_remote_folder(job, job.remote_path, module_list->remote_size);
+    measure_remote_free_space(job, module_list->remote_free);
     return true;
 }
 
 // Whether the sizes over there could be asked for.
-bool discover(RsyncJob &job)
+bool discover(const RsyncJob &job)
 {
-    rsync_prepare_current_job(job);
-    const DaemonAnswer reply = ask_daemon(CurrentJob);
+    const DaemonAnswer reply = ask_daemon(job);
     if (reply.result != REPLY_OK) {
         throw Failure("the rsync daemon cannot be asked: " + printable(reply.line));
     }
-    return job.rsync_mode == RSYNC_MODE_DAEMON ? measure_modules() : measure_path();
+    return job.rsync_mode == RSYNC_MODE_DAEMON ? measure_modules(job) : measure_path(job);
 }
 
 Json size(const SizeText &text)
@@ -128,8 +127,7 @@ void print_text()
 
 int show_remote(const Request &request)
 {
-    RsyncJob job = read_job(request.name).record;
-    const bool measured = discover(job);
+    const bool measured = discover(rsync_with_defaults(read_job(request.name).record));
     if (request.json) {
         print_json({{"modules", modules()},
                     {"remote_free", volumes(module_list->remote_free)},

@@ -30,18 +30,18 @@ void clear_list()
     *module_list = {};
 }
 
-void measure_remote_side()
+void measure_remote_side(const RsyncJob &job)
 {
-    if (CurrentJob.backup_type == BACKUP_PUSH) {
-        rsync_remote_free_space(module_list->remote_free);
+    if (job.backup_type == BACKUP_PUSH) {
+        measure_remote_free_space(job, module_list->remote_free);
         return;
     }
     for (RemoteModule *module = module_list->head; module != nullptr; module = module->next) {
-        rsync_remote_du(module->path, module->du_size);
+        measure_remote_folder(job, module->path, module->du_size);
     }
 }
 
-void measure_this_device()
+void measure_this_device(const RsyncJob &job)
 {
     for (int i = 0; i < VOLUMES; ++i) {
         const std::string mount_point = std::string(VOLUMES_FOLDER) + VOLUME_NAMES[i];
@@ -49,11 +49,11 @@ void measure_this_device()
             rsync_local_free_space(VOLUME_NAMES[i], module_list->local_free[i]);
         }
     }
-    if (was_cut(CurrentJob, "local_path")) {
+    if (was_cut(job, "local_path")) {
         copy_text(module_list->local_size, UNKNOWN_SIZE);
         return;
     }
-    std::string folders = CurrentJob.local_path; // is split in place
+    std::string folders = job.local_path; // is split in place
     rsync_local_du(folders.data(), module_list->local_size);
 }
 
@@ -110,11 +110,11 @@ namespace
 {
 
 // Whether the configuration could be had.
-bool find_configured_modules()
+bool find_configured_modules(const RsyncJob &job)
 {
     // The copy has one name for all: another discovery must not take it away, nor be given ours.
     const UniqueFd lock = rsync_lock_config(DISCOVERY_LOCK_FILE);
-    if (fetch_daemon_config(CurrentJob, DISCOVERY_CONFIG_COPY).why) return false;
+    if (fetch_daemon_config(job, DISCOVERY_CONFIG_COPY).why) return false;
     const bool read = add_configured_modules(DISCOVERY_CONFIG_COPY);
     std::remove(DISCOVERY_CONFIG_COPY);
     sync();
@@ -123,27 +123,27 @@ bool find_configured_modules()
 
 } // namespace
 
-void rsync_discover_remote()
+void discover_remote(const RsyncJob &job)
 {
-    if (CurrentJob.server_type == SERVER_ANY) {
-        rsync_list_daemon_modules();
+    if (job.server_type == SERVER_ANY) {
+        list_daemon_modules(job);
         return;
     }
     clear_list();
-    if (CurrentJob.backup_type == BACKUP_PULL && CurrentJob.rsync_mode == RSYNC_MODE_SHELL) {
-        rsync_remote_du(CurrentJob.remote_path, module_list->remote_size);
+    if (job.backup_type == BACKUP_PULL && job.rsync_mode == RSYNC_MODE_SHELL) {
+        measure_remote_folder(job, job.remote_path, module_list->remote_size);
         return;
     }
-    if (!find_configured_modules()) return;
-    measure_remote_side();
-    measure_this_device();
+    if (!find_configured_modules(job)) return;
+    measure_remote_side(job);
+    measure_this_device(job);
 }
 
-int rsync_list_daemon_modules()
+int list_daemon_modules(const RsyncJob &job)
 {
     clear_list();
-    measure_this_device();
-    const auto command = module_list_command(CurrentJob);
+    measure_this_device(job);
+    const auto command = module_list_command(job);
     if (!command) return 0;
     ShellReader reply(*command);
     if (!reply.started()) return 0;
@@ -154,16 +154,16 @@ int rsync_list_daemon_modules()
     return reply.close();
 }
 
-RemoteReplyCode rsync_check_remote_secret()
+RemoteReplyCode check_remote_secret(const RsyncJob &job)
 {
     char expected[PASSWORD_SIZE] = "";
-    if (CurrentJob.pwd_encoded != 0) {
-        copy_text(expected, CurrentJob.rsync_pwd);
-    } else if (password_encode(expected, CurrentJob.rsync_pwd, sizeof expected) < 0) {
+    if (job.pwd_encoded != 0) {
+        copy_text(expected, job.rsync_pwd);
+    } else if (password_encode(expected, job.rsync_pwd, sizeof expected) < 0) {
         return REPLY_AUTH_FAILED;
     }
     const auto command =
-        ssh_command(CurrentJob, SshLogin::as_client, "cat /etc/rsyncd.secrets 2>/dev/null | grep root:");
+        ssh_command(job, SshLogin::as_client, "cat /etc/rsyncd.secrets 2>/dev/null | grep root:");
     if (!command) return REPLY_AUTH_FAILED;
     ShellReader reply(*command);
     std::string line;
@@ -174,6 +174,21 @@ RemoteReplyCode rsync_check_remote_secret()
     const std::size_t user = line.find(USER);
     const bool matches = user != std::string::npos && line.substr(user + USER.size()) == expected;
     return matches ? REPLY_OK : REPLY_AUTH_FAILED;
+}
+
+void rsync_discover_remote()
+{
+    discover_remote(CurrentJob);
+}
+
+int rsync_list_daemon_modules()
+{
+    return list_daemon_modules(CurrentJob);
+}
+
+RemoteReplyCode rsync_check_remote_secret()
+{
+    return check_remote_secret(CurrentJob);
 }
 
 } // namespace bakjob

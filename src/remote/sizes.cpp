@@ -103,14 +103,14 @@ void rsync_local_free_space(const std::string &volume, SizeText &free)
     if (line) size_of_df_line(*line, free);
 }
 
-void rsync_remote_free_space(SizeText (&free)[VOLUMES])
+void measure_remote_free_space(const RsyncJob &job, SizeText (&free)[VOLUMES])
 {
-    if (CurrentJob.remote_ip[0] == '\0') return;
-    const auto login = ssh_login_of(CurrentJob);
+    if (job.remote_ip[0] == '\0') return;
+    const auto login = ssh_login_of(job);
     std::vector<Checked> commands;
     for (int i = 0; i < VOLUMES; ++i) {
         const std::string remote = format_text("df -h | grep %s 2>&1", VOLUME_NAMES[i]);
-        commands.push_back(login ? ssh_command(CurrentJob, *login, remote) : NO_SSH_LOGIN);
+        commands.push_back(login ? ssh_command(job, *login, remote) : NO_SSH_LOGIN);
         DebugLog("--->[%s]\n", commands.back().value_or("").c_str());
     }
     for (int i = 0; i < VOLUMES; ++i) {
@@ -133,19 +133,29 @@ int rsync_remote_has_du(const std::string &command)
     return line == "/usr/bin/du" ? 1 : 0;
 }
 
-void rsync_remote_du(const std::string &folder, SizeText &size)
+void measure_remote_folder(const RsyncJob &job, const std::string &folder, SizeText &size)
 {
-    if (CurrentJob.remote_ip[0] == '\0') return;
+    if (job.remote_ip[0] == '\0') return;
     if (refusal_for_shells("remote folder", folder)) {
         copy_text(size, UNKNOWN_SIZE);
         return;
     }
     const Checked escaped = shell_path("remote folder", folder);
-    const Checked command = escaped ? du_command(CurrentJob, *escaped) : escaped;
+    const Checked command = escaped ? du_command(job, *escaped) : escaped;
     DebugLog("--->[%s]\n", command.value_or("").c_str());
-    if (!command && ssh_login_of(CurrentJob)) copy_text(size, UNKNOWN_SIZE); // refused
+    if (!command && ssh_login_of(job)) copy_text(size, UNKNOWN_SIZE); // refused
     const auto line = reply_of(command);
     if (line) size_of_du_reply(*line, size);
+}
+
+void rsync_remote_free_space(SizeText (&free)[VOLUMES])
+{
+    measure_remote_free_space(CurrentJob, free);
+}
+
+void rsync_remote_du(const std::string &folder, SizeText &size)
+{
+    measure_remote_folder(CurrentJob, folder, size);
 }
 
 void rsync_local_du(char *folders, SizeText &size)
