@@ -34,8 +34,6 @@ constexpr const char *SAME_NAME = "the names of two jobs begin with the same 127
 constexpr const char *NO_MEMORY = "there is not enough memory";
 constexpr const char *LONG_TEXT = "a text of a job is longer than 1 MiB";
 
-const char *load_failure = nullptr;
-
 // The path of one key of one item; reused from key to key, as there are tens of thousands of them. Made
 // without memory of its own: a save that has begun must not end there.
 class ItemPath
@@ -112,6 +110,8 @@ bool has_endless_text(const RsyncJob &job)
 class JobLoader
 {
 public:
+    explicit JobLoader(RsyncJobList &jobs) : jobs_(jobs) {}
+
     // Null, or why something is left out.
     const char *load()
     {
@@ -141,18 +141,19 @@ private:
             return;
         }
         if (has_endless_text(*job)) failure_ = LONG_TEXT;
-        rsync_list_take_job(std::move(job));
+        rsync_list_take_job(jobs_, std::move(job));
     }
 
+    RsyncJobList &jobs_;
     std::unordered_set<std::string> names_; // of the listed jobs
     int missing_ = 0;
     const char *failure_ = nullptr;
 };
 
-const char *load_or_say_why()
+const char *load_or_say_why(RsyncJobList &jobs)
 {
     try {
-        return JobLoader().load();
+        return JobLoader(jobs).load();
     } catch (const std::bad_alloc &) {
         return NO_MEMORY;
     }
@@ -172,12 +173,12 @@ bool save_job(const RsyncJob &job, int item)
 }
 
 // Whether the store has taken all of them.
-bool save_list()
+bool save_list(const RsyncJobList &jobs)
 {
     bool set = xml_del(JOBS) != XML_UNREADABLE;
-    if (rsync_job_list_empty() == 0) set &= xml_set_int(JOB_COUNT, job_list->count) != XML_UNREADABLE;
+    if (jobs.count > 0) set &= xml_set_int(JOB_COUNT, jobs.count) != XML_UNREADABLE;
     int item = 0;
-    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+    for (const RsyncJob *job = jobs.head; job != nullptr; job = job->next) {
         set &= save_job(*job, ++item);
     }
     return set;
@@ -185,38 +186,40 @@ bool save_list()
 
 } // namespace
 
-bool rsync_load_jobs()
+bool rsync_load_jobs(RsyncJobList &jobs)
 {
-    rsync_free_jobs();
-    load_failure = load_or_say_why();
-    if (load_failure == nullptr) return true;
-    DebugLog("ERROR: jobs are left out: %s\n", load_failure);
+    jobs.clear();
+    jobs.load_failure = load_or_say_why(jobs);
+    if (jobs.load_failure == nullptr) return true;
+    DebugLog("ERROR: jobs are left out: %s\n", jobs.load_failure);
     return false;
 }
 
-const char *rsync_load_failure()
+bool rsync_load_jobs()
 {
-    return load_failure;
+    return rsync_load_jobs(*job_list);
 }
 
-bool rsync_save_jobs()
+bool rsync_save_jobs(RsyncJobList &jobs)
 {
-    if (load_failure != nullptr) {
-        DebugLog("ERROR: jobs are not saved: %s\n", load_failure);
-        rsync_free_jobs();
+    const char *why = jobs.load_failure;
+    if (why == nullptr && !save_list(jobs)) why = "a value could not be set";
+    if (why != nullptr) {
+        DebugLog("ERROR: jobs are not saved: %s\n", why);
+        jobs.clear();
         return false;
     }
-    if (!save_list()) {
-        DebugLog("ERROR: jobs are not saved: a value could not be set\n");
-        rsync_free_jobs();
-        return false;
-    }
-    const bool handed_over = rsync_prune_schedule();
-    rsync_free_jobs(); // before the write, which can use their memory
+    const bool handed_over = rsync_prune_schedule(jobs);
+    jobs.clear(); // before the write, which can use their memory
     if (xml_write_file(CONFIG_FILE) >= 0) return true;
     // The scheduler is not to go by what the file does not say.
     if (handed_over) rsync_apply_schedule();
     return false;
+}
+
+bool rsync_save_jobs()
+{
+    return rsync_save_jobs(*job_list);
 }
 
 } // namespace bakjob

@@ -132,10 +132,10 @@ void delete_group(const Group &group)
 
 using Names = std::unordered_set<std::string_view>;
 
-Names listed_names()
+Names names_of(const RsyncJobList &jobs)
 {
     Names names;
-    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+    for (const RsyncJob *job = jobs.head; job != nullptr; job = job->next) {
         names.insert(job->job_name);
     }
     return names;
@@ -193,36 +193,41 @@ int first_entry_holding(const char *job_name, int entries)
 
 int rsync_schedule_names_job(std::string_view command)
 {
-    return names_one_of(listed_names(), command) ? 1 : 0;
+    return names_one_of(names_of(*job_list), command) ? 1 : 0;
 }
 
 // A command that was cut may name a job behind the cut, so it is not judged.
-bool rsync_prune_schedule()
+bool rsync_prune_schedule(const RsyncJobList &jobs)
 {
-    const Names listed = listed_names();
+    const Names listed = names_of(jobs);
     const int deleted = delete_entries(
         [&](const std::string &command) { return !is_cut(command) && !names_one_of(listed, command); });
     if (deleted > 0) LIB_do_ctc();
     return deleted > 0;
 }
 
-bool rsync_schedules_job(std::string_view command, std::string_view job_name)
+bool rsync_prune_schedule()
+{
+    return rsync_prune_schedule(*job_list);
+}
+
+bool rsync_schedules_job(const RsyncJobList &jobs, std::string_view command, std::string_view job_name)
 {
     if (!names(command, job_name)) return false;
-    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+    for (const RsyncJob *job = jobs.head; job != nullptr; job = job->next) {
         const std::string_view other = job->job_name;
         if (other.size() > job_name.size() && names(command, other)) return false;
     }
     return true;
 }
 
-std::vector<ScheduleEntry> rsync_job_schedule(std::string_view job_name)
+std::vector<ScheduleEntry> rsync_job_schedule(const RsyncJobList &jobs, std::string_view job_name)
 {
     std::vector<ScheduleEntry> found;
     const int entries = find_group().name_path.empty() ? 0 : bounded_count(ENTRY_COUNT);
     for (int entry = 1; entry <= entries; ++entry) {
-        if (rsync_schedules_job(whole_entry_command(entry), job_name))
-            found.push_back(read_entry(entry_path(entry)));
+        if (!rsync_schedules_job(jobs, whole_entry_command(entry), job_name)) continue;
+        found.push_back(read_entry(entry_path(entry)));
     }
     return found;
 }
@@ -256,9 +261,10 @@ bool rsync_add_schedule(const ScheduleEntry &entry)
     return added;
 }
 
-int rsync_unschedule_job(std::string_view job_name)
+int rsync_unschedule_job(const RsyncJobList &jobs, std::string_view job_name)
 {
-    return delete_entries([&](const std::string &command) { return rsync_schedules_job(command, job_name); });
+    return delete_entries(
+        [&](const std::string &command) { return rsync_schedules_job(jobs, command, job_name); });
 }
 
 void rsync_remove_job_schedule(const char *job_name)
