@@ -6,8 +6,10 @@
 #include "config/job_list.h"
 #include "config/job_store.h"
 #include "config/schedule.h"
+#include "config/unrecorded_state.h"
 
 #include <functional>
+#include <string_view>
 
 namespace bakjob
 {
@@ -28,6 +30,15 @@ JobChange change_job(const std::string &job_name,
         RsyncJob *const job = rsync_find_job(jobs, job_name);
         return job != nullptr && change(jobs, *job);
     });
+}
+
+// Without a new name that a job can have, the state goes with the job.
+void move_unrecorded(const std::string &job_name, std::string_view new_name)
+{
+    const auto from = JobName::checked(job_name);
+    const auto to = JobName::checked(new_name);
+    if (from && to) rsync_rename_unrecorded(*from, *to);
+    if (from && !to) rsync_forget_unrecorded(*from);
 }
 
 int set_enable(const std::string &job_name, int value)
@@ -71,17 +82,25 @@ int rsync_add_job(const RsyncJob &job)
 
 int rsync_modify_job(const RsyncJob &job, const std::string &job_name)
 {
-    return answer_of(change_job(job_name, [&](RsyncJobList &, RsyncJob &stored) {
+    bool first_of_its_name = false;
+    const JobChange made = change_job(job_name, [&](RsyncJobList &jobs, RsyncJob &stored) {
         if (stored.schedule_mode != SCHEDULE_TIMETABLE) rsync_remove_job_schedule(stored.job_name);
         rsync_copy_job(stored, job);
+        first_of_its_name = rsync_find_job(jobs, job.job_name) == &stored;
         return true;
-    }));
+    });
+    if (made.saved() && job_name != job.job_name) {
+        move_unrecorded(job_name, first_of_its_name ? job.job_name : "");
+    }
+    return answer_of(made);
 }
 
 int rsync_delete_job(const std::string &job_name)
 {
-    return answer_of(
-        change_job(job_name, [](RsyncJobList &jobs, RsyncJob &job) { return jobs.remove(&job); }));
+    const JobChange made =
+        change_job(job_name, [](RsyncJobList &jobs, RsyncJob &job) { return jobs.remove(&job); });
+    if (made.saved()) move_unrecorded(job_name, "");
+    return answer_of(made);
 }
 
 int rsync_get_job(RsyncJob &job, const std::string &job_name)

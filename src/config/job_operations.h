@@ -21,10 +21,11 @@ int rsync_add_job(const RsyncJob &job);
 
 // Puts `job` in the place of the job of that name, every field as given; a different `job_name` renames it.
 // A stored job without a timetable (`schedule_mode` not 1) loses its scheduler entry first. Renamed onto
-// another job's name, both are saved, and the next load keeps the first alone: look with rsync_job_exists.
+// another job's name, both are saved, and the next load keeps the first alone: look with rsync_job_exists. An
+// unrecorded state (unrecorded_state.h) goes along.
 int rsync_modify_job(const RsyncJob &job, const std::string &job_name);
 
-// Deletes the job and the scheduler entries that name it.
+// Deletes the job, the scheduler entries that name it and its unrecorded state.
 int rsync_delete_job(const std::string &job_name);
 
 // Read only; hold the lock while loading. rsync_get_job leaves `job` as it was when it answers 0.

@@ -46,17 +46,27 @@ StateKind kind_of_run()
     return run_options.restore_mode != 0 ? StateKind::RESTORE : StateKind::BACKUP;
 }
 
-void set_state(RsyncJob &job, StateKind kind, JobState state, const char *now)
+void set_state(RsyncJob &job, StateKind kind, std::int32_t state, const std::string &time)
 {
     (kind == StateKind::RESTORE ? job.rstate : job.state) = state;
-    copy_text(kind == StateKind::RESTORE ? job.rlast_do_job_time : job.last_do_job_time, now);
+    copy_text(kind == StateKind::RESTORE ? job.rlast_do_job_time : job.last_do_job_time, time);
 }
 
-bool reset_if_stale(std::int32_t &state, char (&time)[JOB_TIME_SIZE], const char *now)
+// How a run ended that is recorded as going on and is not: as it has kept that itself, being unable to record
+// it, or else interrupted.
+UnrecordedState end_of_stale_run(const RsyncJob &job, StateKind kind, const char *now)
 {
-    if (rsync_state_is_running(state) == 0) return false;
-    state = JOB_INTERRUPTED;
-    copy_text(time, now);
+    const auto name = JobName::checked(job.job_name);
+    auto kept = name ? rsync_unrecorded_state(*name, kind) : std::nullopt;
+    if (kept && rsync_state_is_running(kept->state) == 0) return *std::move(kept);
+    return {JOB_INTERRUPTED, now};
+}
+
+bool reset_if_stale(RsyncJob &job, StateKind kind, const char *now)
+{
+    if (rsync_state_is_running(kind == StateKind::RESTORE ? job.rstate : job.state) == 0) return false;
+    const UnrecordedState end = end_of_stale_run(job, kind, now);
+    set_state(job, kind, end.state, end.time);
     return true;
 }
 
@@ -124,11 +134,8 @@ void rsync_reset_stale_states()
                 // A name that no run can have has no pid file either.
                 const auto name = JobName::checked(job->job_name);
                 if (name && !rsync_pid_file_absent(*name)) continue;
-                if (reset_if_stale(job->state, job->last_do_job_time, now)) {
-                    changed.emplace_back(job->job_name, StateKind::BACKUP);
-                }
-                if (reset_if_stale(job->rstate, job->rlast_do_job_time, now)) {
-                    changed.emplace_back(job->job_name, StateKind::RESTORE);
+                for (const StateKind kind : {StateKind::BACKUP, StateKind::RESTORE}) {
+                    if (reset_if_stale(*job, kind, now)) changed.emplace_back(job->job_name, kind);
                 }
             }
             return !changed.empty();

@@ -7,6 +7,7 @@
 #include <algorithm>
 #include <array>
 #include <charconv>
+#include <cstdio>
 #include <fcntl.h>
 #include <unistd.h>
 
@@ -77,6 +78,18 @@ void rsync_forget_unrecorded(const JobName &job, StateKind kind)
         if (kept && replace_file(path, 0600, line_of(other, *kept))) return;
     }
     unlink(path.c_str());
+}
+
+void rsync_forget_unrecorded(const JobName &job)
+{
+    unlink(unrecorded_file(job).c_str());
+}
+
+void rsync_rename_unrecorded(const JobName &job, const JobName &new_name)
+{
+    if (std::rename(unrecorded_file(job).c_str(), unrecorded_file(new_name).c_str()) == 0) return;
+    rsync_forget_unrecorded(new_name);
+    rsync_forget_unrecorded(job);
 }
 
 } // namespace bakjob
