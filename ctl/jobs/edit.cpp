@@ -22,8 +22,6 @@ namespace bakjob::ctl
 namespace
 {
 
-constexpr std::size_t LONGEST_COMMAND = 255; // bytes of an entry's command that the module reads
-
 // Passwords are asked for before anything is locked.
 std::vector<Setting> settings_of(const Request &request)
 {
@@ -103,10 +101,10 @@ int add_job(const Request &request)
 {
     const auto name = JobName::checked(request.name);
     if (!name) {
-        throw Failure(
-            "\"" + request.name +
-            "\" is not allowed as a job's name; allowed: up to 127 bytes without / \" \\ | < > * ? and "
-            "control characters");
+        throw Failure("\"" + request.name + "\" is not allowed as a job's name; allowed: up to " +
+                      std::to_string(JOB_NAME_SIZE - 1) +
+                      " bytes without / \" \\ | < > * ? and "
+                      "control characters");
     }
     RsyncJob job = job_with_defaults(request.name);
     apply_settings(job, settings_of(request));
@@ -164,7 +162,7 @@ int schedule_job(const Request &request)
 {
     const auto times = parse_cron_times(request.times);
     const std::string run = run_command(request.name);
-    if (run.size() > LONGEST_COMMAND) throw Failure("the job's name is too long for the scheduler");
+    if (run.size() > MAX_SCHEDULED_COMMAND) throw Failure("the job's name is too long for the scheduler");
     const ScheduleEntry entry{times[0], times[1], times[2], times[3], times[4], "root", run};
     const bool taken_over = change_timetable(request.name, [&](RsyncJobList &jobs, RsyncJob &job) {
         rsync_unschedule_job(jobs, request.name);

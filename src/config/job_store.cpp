@@ -24,7 +24,7 @@ namespace
 
 constexpr const char *JOBS = "/backup_mgr/rsync";
 constexpr const char *JOB_COUNT = "/backup_mgr/rsync/count";
-constexpr int LONGEST_GAP = 1000; // items that are not there, one behind the other
+constexpr int MAX_GAP = 1000; // items that are not there, one behind the other
 
 constexpr const char *UNREADABLE = "the configuration cannot be read";
 constexpr const char *WRONG_COUNT = "/backup_mgr/rsync/count is missing or below 1, but there are items";
@@ -83,10 +83,9 @@ bool load_job(RsyncJob &job, int item)
     WholeTexts whole_texts;
     for (const JobField &field : job_fields()) {
         const char *const key = path.key(field.key);
-        if (field.size == 0) {
+        if (!field.is_text()) {
             const int value = xml_get_int(key);
-            const bool in_range = value >= field.lowest && value <= field.highest;
-            integer_field(job, field) = in_range ? value : field.otherwise;
+            integer_field(job, field) = field.in_range(value) ? value : field.otherwise.value_or(value);
             found |= value != -1;
         } else {
             char *const text = text_field(job, field);
@@ -117,14 +116,14 @@ public:
     {
         const int count = xml_get_int(JOB_COUNT);
         int item = 1;
-        for (; item <= count && missing_ < LONGEST_GAP; ++item) {
+        for (; item <= count && missing_ < MAX_GAP; ++item) {
             try {
                 load_item(item);
             } catch (const std::bad_alloc &) {
                 failure_ = NO_MEMORY;
             }
         }
-        if (missing_ >= LONGEST_GAP) return GAP;
+        if (missing_ >= MAX_GAP) return GAP;
         if (is_unreadable(item)) return UNREADABLE;
         if (store_has(format_text("%s:2", JOBS))) return TWO_LISTS;
         // A count that is too low counts all the same: an earlier, longer list may have left what is behind.
@@ -165,8 +164,8 @@ bool save_job(const RsyncJob &job, int item)
     bool set = true;
     for (const JobField &field : job_fields()) {
         const char *const key = path.key(field.key);
-        const int answer = field.size == 0 ? xml_set_int(key, integer_field(job, field))
-                                           : xml_set_str(key, text_to_save(job, field));
+        const int answer = field.is_text() ? xml_set_str(key, text_to_save(job, field))
+                                           : xml_set_int(key, integer_field(job, field));
         set &= answer != XML_UNREADABLE;
     }
     return set;

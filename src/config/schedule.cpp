@@ -20,9 +20,8 @@ constexpr const char *GROUP = "rsync";
 constexpr const char *GROUP_NODE = "/system_mgr/crond/rsync";
 constexpr const char *ENTRY_COUNT = "/system_mgr/crond/rsync/count";
 constexpr const char *GROUP_COUNT = "/system_mgr/crond/list/count";
-constexpr std::size_t LONGEST_NAME = sizeof(RsyncJob::job_name) - 1;
-constexpr std::size_t TEXT_SIZE = 256; // bytes of a group's name and of a command, terminator included
-constexpr int MOST_ENTRIES = 10'000;
+constexpr std::size_t TEXT_SIZE = MAX_SCHEDULED_COMMAND + 1; // of a group's name or a command
+constexpr int MAX_ENTRIES = 10'000;
 
 struct EntryKey {
     const char *key;
@@ -45,7 +44,7 @@ struct Group {
 int bounded_count(const char *path)
 {
     const int count = xml_get_int(path);
-    if (count <= MOST_ENTRIES) return count;
+    if (count <= MAX_ENTRIES) return count;
     DebugLog("ERROR: [%s] refused: %d\n", path, count);
     return 0;
 }
@@ -146,7 +145,7 @@ Names names_of(const RsyncJobList &jobs)
 bool names_one_of(const Names &names, std::string_view command)
 {
     for (std::size_t open = command.find('\''); open < command.size(); open = command.find('\'', open + 1)) {
-        const std::string_view rest = command.substr(open + 1, LONGEST_NAME + 1);
+        const std::string_view rest = command.substr(open + 1, JOB_NAME_SIZE);
         for (std::size_t close = rest.find('\''); close < rest.size(); close = rest.find('\'', close + 1)) {
             if (names.contains(rest.substr(0, close))) return true;
         }
@@ -252,7 +251,7 @@ bool rsync_add_schedule(const ScheduleEntry &entry)
     const int groups = std::max(xml_get_int(GROUP_COUNT), 0);
     const int entries = std::max(xml_get_int(ENTRY_COUNT), 0);
     const std::string path = entry_path(entries + 1);
-    if (std::max(groups, entries) >= MOST_ENTRIES) return false;
+    if (std::max(groups, entries) >= MAX_ENTRIES) return false;
     if (store_has(path)) return false;
     if (group.name_path.empty() && store_has(group_name_path(groups + 1))) return false;
     const bool added = write_entry(path, entry) && (!group.name_path.empty() || list_group(groups + 1)) &&

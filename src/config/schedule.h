@@ -14,6 +14,9 @@
 namespace bakjob
 {
 
+// Bytes of the longest command that an entry is made with.
+inline constexpr std::size_t MAX_SCHEDULED_COMMAND = 255;
+
 // When an entry runs, in cron's notation, and what.
 struct ScheduleEntry {
     std::string minute, hour, day, month, weekday, user, run;
