@@ -67,7 +67,7 @@ int main(int argc, char **argv)
         return 2;
     }
     if (rsync_add_job(job) == 0) {
-        const char *const failure = rsync_load_failure();
+        const char *const failure = job_list->load_failure;
         std::fprintf(stderr, "manage_jobs: %s\n", failure ? failure : "there is a job of that name");
         return 1;
     }

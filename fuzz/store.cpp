@@ -33,10 +33,9 @@ std::vector<RsyncJob> loaded_jobs()
     std::vector<RsyncJob> jobs;
     for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
         for (const JobField &field : job_fields()) {
-            must(field.size == 0 || std::memchr(text_field(*job, field), '\0', field.size) != nullptr,
+            must(!field.is_text() || std::memchr(text_field(*job, field), '\0', field.size) != nullptr,
                  "texts end within their fields");
-            must(field.size != 0 || (integer_field(*job, field) >= field.lowest &&
-                                     integer_field(*job, field) <= field.highest),
+            must(field.is_text() || !field.otherwise || field.in_range(integer_field(*job, field)),
                  "numbers stay within their range");
         }
         must(rsync_find_job(job->job_name) == job, "a name is listed once");
@@ -49,8 +48,8 @@ std::vector<RsyncJob> loaded_jobs()
 bool is_same(const RsyncJob &one, const RsyncJob &other)
 {
     for (const JobField &field : job_fields()) {
-        if (field.size == 0 && integer_field(one, field) != integer_field(other, field)) return false;
-        if (field.size != 0 && std::strcmp(text_field(one, field), text_field(other, field)) != 0)
+        if (!field.is_text() && integer_field(one, field) != integer_field(other, field)) return false;
+        if (field.is_text() && std::strcmp(text_field(one, field), text_field(other, field)) != 0)
             return false;
     }
     return true;

@@ -1,6 +1,7 @@
 // A configuration that cannot be written, and a run that must say so elsewhere.
 
 #include "common/run_options.h"
+#include "config/job_operations.h"
 #include "config/job_state.h"
 #include "config/unrecorded_state.h"
 #include "ctl_support.h"
@@ -106,6 +107,43 @@ TEST_F(UnrecordedState, AClaimOfARunIsBelievedOnlyWhileThereIsOne)
         write_file(KEPT, damaged);
         EXPECT_TRUE(says(ctl("status"), 1, "interrupted")) << damaged;
     }
+}
+
+TEST_F(UnrecordedState, AResetTakesOverTheEndThatWasKept)
+{
+    rsync_set_job_state("daily", JOB_RUNNING);
+    rsync_keep_unrecorded(named("daily"), StateKind::BACKUP, {JOB_FAILED, "then"});
+    EXPECT_EQ(bakjob_program("-a").status, 0);
+    EXPECT_EQ(job_key(1, "state") + job_key(1, "last_do_job_time"), "4then");
+    EXPECT_FALSE(exists(KEPT));
+}
+
+TEST_F(UnrecordedState, FollowsItsJobToAnotherNameAndGoesWithIt)
+{
+    const bakjob::UnrecordedState failed{JOB_FAILED, "then"};
+    const auto kept = [](const char *name) {
+        return rsync_unrecorded_state(named(name), StateKind::BACKUP).has_value();
+    };
+    rsync_add_job(make_job("other"));
+    rsync_keep_unrecorded(named("daily"), StateKind::BACKUP, failed);
+    rsync_keep_unrecorded(named("new"), StateKind::RESTORE, failed); // an earlier job's
+    lock_configuration();
+    rsync_modify_job(make_job("new"), "daily");
+    EXPECT_TRUE(kept("daily")) << "the name is not written";
+    unlock_configuration();
+    rsync_modify_job(make_job("new"), "daily");
+    EXPECT_TRUE(kept("new") && !exists(KEPT));
+    EXPECT_FALSE(rsync_unrecorded_state(named("new"), StateKind::RESTORE));
+
+    rsync_keep_unrecorded(named("other"), StateKind::BACKUP, failed);
+    rsync_delete_job("new");
+    EXPECT_FALSE(kept("new"));
+    rsync_add_job(make_job("last"));
+    rsync_keep_unrecorded(named("last"), StateKind::BACKUP, {JOB_KILLED, "now"});
+    rsync_modify_job(make_job("other"), "last");
+    EXPECT_FALSE(kept("last"));
+    EXPECT_EQ(rsync_unrecorded_state(named("other"), StateKind::BACKUP)->state, JOB_FAILED)
+        << "that of the first job of the name";
 }
 
 TEST_F(UnrecordedState, ACheckFindsThatThereIsNoRoomForAnotherCopy)

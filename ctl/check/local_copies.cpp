@@ -40,7 +40,7 @@ void check_row(const RsyncJob &job, Findings &findings)
 void check_marks(const RsyncJob &job, Findings &findings)
 {
     std::string unknown;
-    for (int number = 0; number < MOST_SNAPSHOTS; ++number) {
+    for (int number = 0; number < MAX_SNAPSHOTS; ++number) {
         const std::string path = snapshot_path(job.local_path, job.job_name, number);
         if (!is_directory(path) || is_marked_whole(path)) continue;
         unknown += (unknown.empty() ? "" : ", ") + snapshot_name(job.job_name, number);

@@ -4,7 +4,6 @@
 #include "output/failure.h"
 
 #include <algorithm>
-#include <charconv>
 #include <optional>
 #include <span>
 #include <string_view>
@@ -41,14 +40,6 @@ std::string_view cut_at(std::string_view &text, char separator)
     return part;
 }
 
-std::optional<int> number_in(std::string_view text, int lowest, int highest)
-{
-    int number = 0;
-    const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
-    const bool whole = error == std::errc() && end == text.data() + text.size();
-    return whole && number >= lowest && number <= highest ? std::optional(number) : std::nullopt;
-}
-
 std::optional<int> value_in(std::string_view text, const CronField &field)
 {
     std::string lower(text);
@@ -56,7 +47,7 @@ std::optional<int> value_in(std::string_view text, const CronField &field)
                    [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + ('a' - 'A')) : c; });
     const auto word = std::find(field.words.begin(), field.words.end(), lower);
     if (word != field.words.end()) return field.lowest + static_cast<int>(word - field.words.begin());
-    return number_in(text, field.lowest, field.highest);
+    return whole_number(text, field.lowest, field.highest);
 }
 
 // "*", "N" or "N-M", and behind the first and the last perhaps "/STEP".
@@ -64,7 +55,7 @@ bool is_range(std::string_view text, const CronField &field)
 {
     const bool stepped = contains(text, "/");
     std::string_view range = cut_at(text, '/');
-    if (stepped && !number_in(text, 1, field.highest)) return false;
+    if (stepped && !whole_number(text, 1, field.highest)) return false;
     if (range == "*") return true;
     const bool open = contains(range, "-");
     if (stepped && !open) return false;

@@ -3,7 +3,6 @@
 #include "common/job_files.h"
 #include "common/shell_text.h"
 #include "config/config_lock.h"
-#include "config/job_list.h"
 #include "config/schedule.h"
 #include "jobs/commands.h"
 #include "jobs/cron.h"
@@ -22,8 +21,6 @@ namespace bakjob::ctl
 
 namespace
 {
-
-constexpr std::size_t LONGEST_COMMAND = 255; // bytes of an entry's command that the module reads
 
 // Passwords are asked for before anything is locked.
 std::vector<Setting> settings_of(const Request &request)
@@ -45,7 +42,7 @@ void require(const RsyncJob &job)
 
 int set_enable(const Request &request, int enable)
 {
-    change_job(request.name, [&](RsyncJob &job) { job.enable = enable; });
+    change_job(request.name, [&](RsyncJobList &, RsyncJob &job) { job.enable = enable; });
     return EXIT_FINE;
 }
 
@@ -58,12 +55,13 @@ bool hand_over()
 
 // A change of a job that changes its timetable, too: saved at once, and then handed over to the scheduler.
 // Whether that took it.
-bool change_timetable(const std::string &name, const std::function<void(RsyncJob &)> &change)
+bool change_timetable(const std::string &name,
+                      const std::function<void(RsyncJobList &jobs, RsyncJob &job)> &change)
 {
     bool changed = false;
     try {
-        change_job(name, [&](RsyncJob &job) {
-            change(job);
+        change_job(name, [&](RsyncJobList &jobs, RsyncJob &job) {
+            change(jobs, job);
             changed = true;
         });
     } catch (const Failure &failure) {
@@ -103,19 +101,19 @@ int add_job(const Request &request)
 {
     const auto name = JobName::checked(request.name);
     if (!name) {
-        throw Failure(
-            "\"" + request.name +
-            "\" is not allowed as a job's name; allowed: up to 127 bytes without / \" \\ | < > * ? and "
-            "control characters");
+        throw Failure("\"" + request.name + "\" is not allowed as a job's name; allowed: up to " +
+                      std::to_string(JOB_NAME_SIZE - 1) +
+                      " bytes without / \" \\ | < > * ? and "
+                      "control characters");
     }
     RsyncJob job = job_with_defaults(request.name);
     apply_settings(job, settings_of(request));
     require(job);
-    change_jobs([&] {
-        if (rsync_find_job(request.name) != nullptr) {
+    change_jobs([&](RsyncJobList &jobs) {
+        if (rsync_find_job(jobs, request.name) != nullptr) {
             throw Failure("there is a job \"" + request.name + "\" already");
         }
-        if (rsync_list_add_job(job) == 0) throw Failure("no memory");
+        if (rsync_list_add_job(jobs, job) == 0) throw Failure("no memory");
     });
     // Of an earlier job of this name.
     unlink(unrecorded_file(*name).c_str());
@@ -126,7 +124,7 @@ int set_job(const Request &request)
 {
     if (request.settings.empty()) throw Failure("nothing to set: give key=value");
     const auto settings = settings_of(request);
-    change_job(request.name, [&](RsyncJob &job) {
+    change_job(request.name, [&](RsyncJobList &, RsyncJob &job) {
         apply_settings(job, settings);
         require(job);
     });
@@ -135,12 +133,12 @@ int set_job(const Request &request)
 
 int delete_job(const Request &request)
 {
-    const bool taken_over = change_timetable(request.name, [&](RsyncJob &job) {
+    const bool taken_over = change_timetable(request.name, [&](RsyncJobList &jobs, RsyncJob &job) {
         if (run_of(request.name) == Run::GOING_ON) {
             throw Failure("a run of it is going on; bakjob -k " + name_for_shell(request.name) + " ends it");
         }
-        rsync_unschedule_job(request.name);
-        rsync_list_remove_job(&job);
+        rsync_unschedule_job(jobs, request.name);
+        jobs.remove(&job);
     });
     remove_files_of(request.name);
     if (!taken_over) {
@@ -164,10 +162,10 @@ int schedule_job(const Request &request)
 {
     const auto times = parse_cron_times(request.times);
     const std::string run = run_command(request.name);
-    if (run.size() > LONGEST_COMMAND) throw Failure("the job's name is too long for the scheduler");
+    if (run.size() > MAX_SCHEDULED_COMMAND) throw Failure("the job's name is too long for the scheduler");
     const ScheduleEntry entry{times[0], times[1], times[2], times[3], times[4], "root", run};
-    const bool taken_over = change_timetable(request.name, [&](RsyncJob &job) {
-        rsync_unschedule_job(request.name);
+    const bool taken_over = change_timetable(request.name, [&](RsyncJobList &jobs, RsyncJob &job) {
+        rsync_unschedule_job(jobs, request.name);
         if (!rsync_add_schedule(entry)) {
             throw Failure("the configuration does not take the entry: there are too many, or more than their "
                           "count says; nothing is changed");
@@ -185,8 +183,9 @@ int unschedule_job(const Request &request)
 {
     const auto difference = schedule_difference(request.name);
     const bool left_over = difference && !difference->left_over.empty();
-    const bool taken_over = change_timetable(request.name, [&](RsyncJob &) {
-        if (rsync_unschedule_job(request.name) == 0 && !left_over) throw Failure("the job has no timetable");
+    const bool taken_over = change_timetable(request.name, [&](RsyncJobList &jobs, RsyncJob &) {
+        if (rsync_unschedule_job(jobs, request.name) == 0 && !left_over)
+            throw Failure("the job has no timetable");
     });
     if (!taken_over) {
         throw Failure("the timetable is no longer in the configuration, but the scheduler did not take that "

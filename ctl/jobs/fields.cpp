@@ -1,21 +1,18 @@
 #include "jobs/fields.h"
 
 #include "common/folder_table.h"
+#include "common/job_files.h"
 #include "common/shell_text.h"
 #include "common/text.h"
 #include "output/failure.h"
 
 #include <algorithm>
-#include <charconv>
-#include <cstring>
 
 namespace bakjob::ctl
 {
 
 namespace
 {
-
-constexpr std::size_t LONGEST_PASSWORD = 93; // bytes whose base64 text fits its field
 
 bool has_no_control(std::string_view text)
 {
@@ -30,10 +27,7 @@ bool is_host(std::string_view text)
 // A run takes blanks behind the number.
 bool is_port(std::string_view text)
 {
-    text = text.substr(0, text.find_last_not_of(' ') + 1);
-    int port = 0;
-    const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), port);
-    return error == std::errc() && end == text.data() + text.size() && port >= 1 && port <= 65535;
+    return whole_number(text.substr(0, text.find_last_not_of(' ') + 1), 1, MAX_PORT).has_value();
 }
 
 bool is_remote_path(std::string_view text)
@@ -72,32 +66,70 @@ bool is_rsync_user(std::string_view text)
 
 bool is_password(std::string_view text)
 {
-    return text.size() <= LONGEST_PASSWORD && has_no_control(text);
+    return text.size() <= MAX_ENCODED_PASSWORD && has_no_control(text);
 }
 
 const std::vector<Choice> NO_YES = {{0, "no"}, {1, "yes"}};
-constexpr const char *PASSWORD_RULE = "up to 93 bytes, no control character";
-constexpr const char *TEXT_RULE = "no control character";
+constexpr const char *NO_CONTROL = "no control character";
 
 FieldRule own(const char *key, const char *meaning)
 {
     return {.key = key, .kind = FieldKind::OWN, .meaning = meaning};
 }
 
+FieldRule number(const char *key, const char *meaning)
+{
+    const JobField &field = job_field(key);
+    return {.key = key,
+            .kind = FieldKind::PLAIN,
+            .meaning = meaning,
+            .allowed = std::to_string(field.lowest) + " to " + std::to_string(field.highest)};
+}
+
 FieldRule choice(const char *key, const char *meaning, std::vector<Choice> choices)
 {
-    return {.key = key, .kind = FieldKind::CHOICE, .meaning = meaning, .choices = std::move(choices)};
+    std::string allowed;
+    for (const Choice &each : choices) {
+        allowed += (allowed.empty() ? "" : ", ") + std::to_string(each.value) + " (" + each.word + ")";
+    }
+    return {.key = key,
+            .kind = FieldKind::PLAIN,
+            .meaning = meaning,
+            .choices = std::move(choices),
+            .allowed = std::move(allowed)};
 }
 
-FieldRule number(const char *key, const char *meaning, int lowest, int highest)
+std::string up_to(std::size_t bytes, const std::string &rule)
 {
-    return {.key = key, .kind = FieldKind::NUMBER, .meaning = meaning, .lowest = lowest, .highest = highest};
+    return "up to " + std::to_string(bytes) + " bytes, " + rule;
 }
 
-FieldRule text(const char *key, const char *meaning, bool (*test)(std::string_view), const char *allowed,
-               FieldKind kind = FieldKind::TEXT)
+FieldRule text(const char *key, const char *meaning, bool (*passes)(std::string_view),
+               const std::string &rule)
 {
-    return {.key = key, .kind = kind, .meaning = meaning, .test = test, .allowed = allowed};
+    return {.key = key,
+            .kind = FieldKind::PLAIN,
+            .meaning = meaning,
+            .text_passes = passes,
+            .allowed = up_to(job_field(key).size - 1, rule)};
+}
+
+FieldRule port(const char *key, const char *meaning)
+{
+    return {.key = key,
+            .kind = FieldKind::PLAIN,
+            .meaning = meaning,
+            .text_passes = is_port,
+            .allowed = "1 to " + std::to_string(MAX_PORT)};
+}
+
+FieldRule password(const char *key, const char *meaning)
+{
+    return {.key = key,
+            .kind = FieldKind::SECRET,
+            .meaning = meaning,
+            .text_passes = is_password,
+            .allowed = up_to(MAX_ENCODED_PASSWORD, NO_CONTROL)};
 }
 
 const FieldRule *find_rule(std::string_view key)
@@ -108,32 +140,21 @@ const FieldRule *find_rule(std::string_view key)
     return nullptr;
 }
 
-const JobField &field_of(const FieldRule &rule)
-{
-    const auto fields = job_fields();
-    return *std::find_if(fields.begin(), fields.end(),
-                         [&](const JobField &field) { return std::strcmp(field.key, rule.key) == 0; });
-}
-
 // The number that a value means for the key, if it may be given.
 std::optional<int> number_of(const FieldRule &rule, const std::string &value)
 {
     for (const Choice &choice : rule.choices) {
         if (value == choice.word) return choice.value;
     }
-    int number = 0;
-    const auto [end, error] = std::from_chars(value.data(), value.data() + value.size(), number);
-    if (error != std::errc() || end != value.data() + value.size()) return std::nullopt;
-    const bool chosen = std::any_of(rule.choices.begin(), rule.choices.end(),
-                                    [&](const Choice &choice) { return choice.value == number; });
-    const bool in_range = rule.kind == FieldKind::NUMBER && number >= rule.lowest && number <= rule.highest;
-    return chosen || in_range ? std::optional(number) : std::nullopt;
+    const JobField &field = job_field(rule.key);
+    return whole_number(value, field.lowest, field.highest);
 }
 
 bool is_allowed(const FieldRule &rule, const std::string &value)
 {
-    if (rule.test == nullptr) return number_of(rule, value).has_value();
-    return value.size() < field_of(rule).size && rule.test(value);
+    const JobField &field = job_field(rule.key);
+    if (!field.is_text()) return number_of(rule, value).has_value();
+    return value.size() < field.size && rule.text_passes(value);
 }
 
 Setting parse_setting(const std::string &text, const std::function<std::string(const std::string &key)> &ask)
@@ -155,7 +176,7 @@ Setting parse_setting(const std::string &text, const std::function<std::string(c
     }
     if (is_allowed(*rule, value)) return {rule, value};
     const std::string given = secret ? "what was given" : "\"" + value + "\"";
-    throw Failure(key + ": " + given + " is not allowed; allowed: " + allowed_values(*rule));
+    throw Failure(key + ": " + given + " is not allowed; allowed: " + rule->allowed);
 }
 
 void set_password(RsyncJob &job, const JobField &field, const std::string &value)
@@ -178,57 +199,45 @@ const std::vector<FieldRule> &field_rules()
         choice("enable", "whether the job may run", NO_YES),
         own("state", "how the last run ended"),
         own("pwd_encoded", "whether the passwords are kept as base64 text"),
-        choice("server_type", "kind of the remote side", {{1, "appliance"}, {2, "other"}}),
-        choice("backup_type", "direction", {{1, "push"}, {2, "pull"}}),
+        choice("server_type", "kind of the remote side",
+               {{SERVER_SAME_KIND, "appliance"}, {SERVER_ANY, "other"}}),
+        choice("backup_type", "direction", {{BACKUP_PUSH, "push"}, {BACKUP_PULL, "pull"}}),
         choice("rsync_mode", "what remote_path is: a path on the host, or a daemon's module and a path in it",
-               {{1, "path"}, {2, "module"}}),
-        choice("schedule_mode", "when the job runs", {{1, "timetable"}, {2, "once"}, {3, "event"}}),
+               {{RSYNC_MODE_SHELL, "path"}, {RSYNC_MODE_DAEMON, "module"}}),
+        choice("schedule_mode", "when the job runs",
+               {{SCHEDULE_TIMETABLE, "timetable"}, {SCHEDULE_ONCE, "once"}, {SCHEDULE_EVENT, "event"}}),
         choice("use_ssh", "whether the transfer goes through ssh", NO_YES),
         choice("keep_exist_file",
                "files at the target: mirror deletes what is gone, keep leaves all as they are, update "
                "deletes nothing",
-               {{0, "mirror"}, {1, "keep"}, {2, "update"}}),
+               {{EXISTING_MIRROR, "mirror"}, {EXISTING_KEEP, "keep"}, {EXISTING_UPDATE, "update"}}),
         choice("inc_enable", "whether a job that pulls keeps snapshots", NO_YES),
-        number("inc_number", "how many snapshots", 3, 10),
-        number("retry", "attempts", 0, 15),
-        number("retry_interval", "seconds between attempts", 1, 180),
-        number("rsync_timeout", "seconds of silence that end a transfer, 0 for none", 0, INT_MAX),
+        number("inc_number", "how many snapshots"),
+        number("retry", "attempts"),
+        number("retry_interval", "seconds between attempts"),
+        number("rsync_timeout", "seconds of silence that end a transfer, 0 for none"),
         own("last_do_job_time", "when the state was recorded"),
         own("job_name", "part of the folders' names on both sides, so it stays as it was added"),
         text("rsync_user", "login at the daemon", is_rsync_user, NAME_RULE),
-        text("rsync_pwd", "its password, empty for the default", is_password, PASSWORD_RULE,
-             FieldKind::SECRET),
+        password("rsync_pwd", "its password, empty for the default"),
         text("ssh_user", "login at the ssh server", is_ssh_user, NAME_RULE),
-        text("ssh_pwd", "its password, empty for keys", is_password, PASSWORD_RULE, FieldKind::SECRET),
-        text("port", "the daemon's port", is_port, "1 to 65535"),
+        password("ssh_pwd", "its password, empty for keys"),
+        port("port", "the daemon's port"),
         text("remote_ip", "address or host name", is_host, NAME_RULE),
         text("remote_path", "where the data goes to or comes from", is_remote_path,
              "a path without any of \" \\ | < > * ? and control characters"),
         text("local_path", "folders of the shares", is_folder_list,
-             "up to 10 paths separated by ':', each from / on, below 260 bytes, without .. and any of "
-             "\" \\ | < > * ? and control characters"),
+             format_text(
+                 "up to %d paths separated by ':', each from / on, below %d bytes, without .. and any of "
+                 "\" \\ | < > * ? and control characters",
+                 FolderTable::SIZE, FolderTable::WIDTH)),
         own("rsync_pwd_file", "file that hands the password to rsync"),
-        text("user_description", "a note", has_no_control, TEXT_RULE),
+        text("user_description", "a note", has_no_control, NO_CONTROL),
         own("rstate", "how the last restore ended"),
         own("rlast_do_job_time", "when that was recorded"),
-        text("in_remote_cloud_fqdn", "a name for the remote side", has_no_control, TEXT_RULE),
+        text("in_remote_cloud_fqdn", "a name for the remote side", has_no_control, NO_CONTROL),
     };
     return rules;
-}
-
-std::string allowed_values(const FieldRule &rule)
-{
-    std::string values;
-    for (const Choice &choice : rule.choices) {
-        values += (values.empty() ? "" : ", ") + std::to_string(choice.value) + " (" + choice.word + ")";
-    }
-    if (rule.kind == FieldKind::NUMBER) {
-        return std::to_string(rule.lowest) + " to " + std::to_string(rule.highest);
-    }
-    if (rule.kind == FieldKind::TEXT && rule.test != is_port) {
-        return "up to " + std::to_string(field_of(rule).size - 1) + " bytes, " + rule.allowed;
-    }
-    return rule.allowed == nullptr ? values : rule.allowed;
 }
 
 std::vector<Setting> parse_settings(const std::vector<std::string> &texts,
@@ -245,13 +254,13 @@ std::vector<Setting> parse_settings(const std::vector<std::string> &texts,
 void apply_settings(RsyncJob &job, const std::vector<Setting> &settings)
 {
     for (const auto &[rule, value] : settings) {
-        const JobField &field = field_of(*rule);
+        const JobField &field = job_field(rule->key);
         if (rule->kind == FieldKind::SECRET) {
             set_password(job, field, value);
-        } else if (field.size == 0) {
-            integer_field(job, field) = number_of(*rule, value).value();
-        } else {
+        } else if (field.is_text()) {
             copy_text(text_field(job, field), field.size, value);
+        } else {
+            integer_field(job, field) = number_of(*rule, value).value();
         }
         forget_whole_text(job, field.key);
     }
@@ -260,17 +269,18 @@ void apply_settings(RsyncJob &job, const std::vector<Setting> &settings)
 RsyncJob job_with_defaults(const std::string &name)
 {
     RsyncJob job{};
+    for (const JobField &field : job_fields()) {
+        if (field.otherwise) integer_field(job, field) = *field.otherwise;
+    }
     job.enable = 1;
     job.pwd_encoded = 1;
     job.server_type = SERVER_ANY;
     job.backup_type = BACKUP_PUSH;
     job.rsync_mode = RSYNC_MODE_DAEMON;
     job.schedule_mode = SCHEDULE_TIMETABLE;
-    job.keep_exist_file = 2;
-    job.inc_number = 3;
+    job.keep_exist_file = EXISTING_UPDATE;
+    job.inc_number = MIN_SNAPSHOTS;
     job.retry = 3;
-    job.retry_interval = 30;
-    job.rsync_timeout = 600;
     copy_text(job.rsync_user, "root");
     copy_text(job.ssh_user, "root");
     copy_text(job.port, DEFAULT_PORT);
@@ -296,7 +306,7 @@ bool is_secret(const JobField &field)
 std::string shown_value(const RsyncJob &job, const JobField &field)
 {
     if (is_secret(field)) return *text_field(job, field) == '\0' ? "(none)" : "(set)";
-    if (field.size != 0) return text_field(job, field);
+    if (field.is_text()) return text_field(job, field);
     const int value = integer_field(job, field);
     const std::string word = word_of(field.key, value);
     return std::to_string(value) + (word.empty() ? "" : " (" + word + ")");
@@ -307,9 +317,9 @@ std::string refusal_of(const RsyncJob &job, const JobField &field)
     const FieldRule *const rule = find_rule(field.key);
     if (rule->kind == FieldKind::OWN || rule->kind == FieldKind::SECRET) return "";
     const std::string value =
-        field.size == 0 ? std::to_string(integer_field(job, field)) : text_field(job, field);
+        field.is_text() ? text_field(job, field) : std::to_string(integer_field(job, field));
     if (!was_cut(job, field.key) && is_allowed(*rule, value)) return "";
-    return "\"" + value + "\" is not allowed; allowed: " + allowed_values(*rule);
+    return "\"" + value + "\" is not allowed; allowed: " + rule->allowed;
 }
 
 } // namespace bakjob::ctl

@@ -18,10 +18,8 @@ struct Choice {
 };
 
 enum class FieldKind {
-    CHOICE, // one of `choices`
-    NUMBER, // lowest..highest
-    TEXT,   // what `test` lets pass
-    SECRET, // as text; never shown, and never taken from the command line
+    PLAIN,
+    SECRET, // never shown, and never taken from the command line
     OWN     // bakjob's own: shown, never set
 };
 
@@ -29,18 +27,13 @@ struct FieldRule {
     const char *key;
     FieldKind kind;
     const char *meaning;
-    std::vector<Choice> choices{};
-    int lowest = 0;
-    int highest = 0;
-    bool (*test)(std::string_view text) = nullptr;
-    const char *allowed = nullptr; // in words, what `test` lets pass
+    std::vector<Choice> choices{};                         // a number's words; empty: it has none
+    bool (*text_passes)(std::string_view value) = nullptr; // a text's test beyond its length
+    std::string allowed{};                                 // what may be given, in words
 };
 
 // In the order in which the store keeps the keys.
 const std::vector<FieldRule> &field_rules();
-
-// What a key may be given, in words; empty for keys that are bakjob's own.
-std::string allowed_values(const FieldRule &rule);
 
 struct Setting {
     const FieldRule *rule;

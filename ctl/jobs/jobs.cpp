@@ -5,11 +5,9 @@
 #include "common/job_files.h"
 #include "common/shell_text.h"
 #include "config/config_lock.h"
-#include "config/job_list.h"
-#include "config/job_operations.h"
+#include "config/job_change.h"
 #include "config/job_store.h"
 #include "output/failure.h"
-#include "platform/device.h"
 
 #include <cerrno>
 #include <cstring>
@@ -27,19 +25,20 @@ namespace
 
 } // namespace
 
-void load_jobs()
+const RsyncJobList &load_jobs()
 {
-    if (!rsync_load_jobs()) throw Failure(std::string("not all jobs can be read: ") + rsync_load_failure());
+    if (rsync_load_jobs()) return *job_list;
+    throw Failure(std::string("not all jobs can be read: ") + job_list->load_failure);
 }
 
 std::vector<StoredJob> read_jobs()
 {
     const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
-    load_jobs();
+    const RsyncJobList &list = load_jobs();
     std::vector<StoredJob> jobs;
-    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+    for (const RsyncJob *job = list.head; job != nullptr; job = job->next) {
         rsync_copy_job(jobs.emplace_back().record, *job);
-        jobs.back().schedule = rsync_job_schedule(job->job_name);
+        jobs.back().schedule = rsync_job_schedule(list, job->job_name);
     }
     rsync_free_jobs();
     return jobs;
@@ -53,34 +52,36 @@ StoredJob read_job(const std::string &name)
     no_such_job(name);
 }
 
-void change_jobs(const std::function<void()> &change)
+void change_jobs(const std::function<void(RsyncJobList &jobs)> &change)
 {
-    const auto changing = [&] {
-        change();
+    const auto changing = [&](RsyncJobList &jobs) {
+        change(jobs);
         return true;
     };
-    const JobChange changed = rsync_change_jobs(changing, WithoutLock::REFUSE);
-    if (changed == JobChange::NOT_LOCKED) {
+    const JobChange made = rsync_change_jobs(changing, {.needs_lock = true, .to_flash = ToFlash::WHEN_SAVED});
+    switch (made.result) {
+    case ChangeResult::NOT_LOCKED:
         throw Failure(std::string(CONFIG_LOCK_FILE) + " cannot be locked: " + std::strerror(errno) +
                       "; nothing is changed");
-    }
-    if (changed == JobChange::NOT_LOADED) {
+    case ChangeResult::NOT_LOADED:
         throw Failure(std::string("nothing is changed, as not all jobs can be read: ") +
-                      rsync_load_failure());
-    }
-    if (changed != JobChange::SAVED) throw Failure("the configuration could not be written");
-    const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
-    if (!lock || LIB_CP_Config_To_MTD(1) < 0) {
+                      job_list->load_failure);
+    case ChangeResult::NOT_SAVED:
+        throw Failure("the configuration could not be written");
+    case ChangeResult::NOT_IN_FLASH:
         throw Failure("the configuration is changed, but could not be copied to flash");
+    case ChangeResult::UNCHANGED:
+    case ChangeResult::SAVED:
+        return;
     }
 }
 
-void change_job(const std::string &name, const std::function<void(RsyncJob &)> &change)
+void change_job(const std::string &name, const std::function<void(RsyncJobList &jobs, RsyncJob &job)> &change)
 {
-    change_jobs([&] {
-        RsyncJob *const job = rsync_find_job(name);
+    change_jobs([&](RsyncJobList &jobs) {
+        RsyncJob *const job = rsync_find_job(jobs, name);
         if (job == nullptr) no_such_job(name);
-        change(*job);
+        change(jobs, *job);
     });
 }
 

@@ -2,7 +2,7 @@
 
 // Jobs as the commands need them: read whole, or changed, saved and copied to flash.
 
-#include "config/job.h"
+#include "config/job_list.h"
 #include "config/schedule.h"
 
 #include <functional>
@@ -17,8 +17,8 @@ struct StoredJob {
     std::vector<ScheduleEntry> schedule;
 };
 
-// Loads the list; Failure when a job may be left out.
-void load_jobs();
+// Loads the process's list; Failure when a job may be left out.
+const RsyncJobList &load_jobs();
 
 std::vector<StoredJob> read_jobs();
 
@@ -28,10 +28,11 @@ StoredJob read_job(const std::string &name);
 // Runs `change` on the loaded job list under the configuration lock, saves, and copies the configuration to
 // flash. Nothing is saved when `change` throws; Failure when the lock cannot be had, or the save or the copy
 // fails.
-void change_jobs(const std::function<void()> &change);
+void change_jobs(const std::function<void(RsyncJobList &jobs)> &change);
 
 // The same for one job.
-void change_job(const std::string &name, const std::function<void(RsyncJob &)> &change);
+void change_job(const std::string &name,
+                const std::function<void(RsyncJobList &jobs, RsyncJob &job)> &change);
 
 // The folders of a job that a run would transfer.
 std::vector<std::string> folders_of(const RsyncJob &job);

@@ -47,10 +47,10 @@ Json json_of_record(const StoredJob &job)
     for (const JobField &field : job_fields()) {
         if (is_secret(field)) {
             keys[field.key] = *text_field(job.record, field) != '\0';
-        } else if (field.size == 0) {
-            keys[field.key] = integer_field(job.record, field);
-        } else {
+        } else if (field.is_text()) {
             keys[field.key] = text_field(job.record, field);
+        } else {
+            keys[field.key] = integer_field(job.record, field);
         }
     }
     Json all = json_of(summary_of(job));
@@ -130,8 +130,8 @@ int show_keys(const Request &request)
     for (const FieldRule &rule : field_rules()) {
         if (rule.kind == FieldKind::OWN) continue;
         rows.push_back(request.names ? Row{rule.key} : Row{rule.key, rule.meaning});
-        if (!request.names) rows.push_back({"", allowed_values(rule)});
-        list.push_back({{"key", rule.key}, {"meaning", rule.meaning}, {"allowed", allowed_values(rule)}});
+        if (!request.names) rows.push_back({"", rule.allowed});
+        list.push_back({{"key", rule.key}, {"meaning", rule.meaning}, {"allowed", rule.allowed}});
     }
     if (request.json) {
         print_json(list);

@@ -3,8 +3,6 @@
 #include "common/job_files.h"
 #include "common/private_file.h"
 #include "config/config_lock.h"
-#include "config/job_list.h"
-#include "config/job_store.h"
 #include "config/schedule.h"
 #include "jobs/jobs.h"
 #include "jobs/summary.h"
@@ -59,18 +57,19 @@ std::optional<ScheduleDifference> schedule_difference(const std::string &job_nam
 {
     if (!is_directory(CRON_FOLDER)) return std::nullopt;
     const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
-    load_jobs();
+    const RsyncJobList &jobs = load_jobs();
     ScheduleDifference difference;
     std::set<std::string> taken_over = cron_lines();
-    for (const ScheduleEntry &entry : rsync_job_schedule(job_name)) {
+    for (const ScheduleEntry &entry : rsync_job_schedule(jobs, job_name)) {
         const std::string line = cron_line(entry);
         if (!taken_over.contains(line)) difference.missing.push_back(line);
     }
     for (const ScheduleEntry &entry : rsync_all_schedules()) {
         taken_over.erase(cron_line(entry));
     }
-    std::copy_if(taken_over.begin(), taken_over.end(), std::back_inserter(difference.left_over),
-                 [&](const std::string &line) { return rsync_schedules_job(command_in(line), job_name); });
+    std::copy_if(
+        taken_over.begin(), taken_over.end(), std::back_inserter(difference.left_over),
+        [&](const std::string &line) { return rsync_schedules_job(jobs, command_in(line), job_name); });
     rsync_free_jobs();
     return difference;
 }

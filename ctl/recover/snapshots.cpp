@@ -53,7 +53,7 @@ int show_snapshots(const Request &request)
     std::vector<Row> rows;
     Json list = Json::array();
     // By their names: bakjob's own listing takes whatever begins so, and no more than ten.
-    for (int number = 1; number <= MOST_SNAPSHOTS; ++number) {
+    for (int number = 1; number <= MAX_SNAPSHOTS; ++number) {
         const std::string path = snapshot_path(job.local_path, job.job_name, number - 1);
         if (!is_directory(path)) continue;
         // What a part of the files lacks, a recover run deletes at the remote side.

@@ -1,8 +1,10 @@
 #include "atomic_file.h"
 
+#include "common/text.h"
+
+#include <algorithm>
 #include <array>
 #include <cerrno>
-#include <charconv>
 #include <csignal>
 #include <cstdio>
 #include <dirent.h>
@@ -42,10 +44,7 @@ pid_t owner_of(std::string_view name, std::string_view start)
 {
     if (!name.starts_with(start)) return 0;
     name.remove_prefix(start.size());
-    pid_t pid = 0;
-    const auto [end, error] = std::from_chars(name.data(), name.data() + name.size(), pid);
-    const bool whole = error == std::errc() && end == name.data() + name.size();
-    return whole && pid > 0 ? pid : 0;
+    return std::max(bakjob::whole_number<pid_t>(name).value_or(0), 0);
 }
 
 void remove_leftovers(const std::string &folder, const std::string &start)

@@ -24,11 +24,11 @@ bool is_within(std::string_view path, std::string_view list)
 
 void ReadLists::read(std::string_view path)
 {
-    constexpr std::size_t MOST_LISTS = 64;
+    constexpr std::size_t MAX_LISTS = 64;
     const std::string_view list = list_of(path);
     std::erase(outdated_, list);
     const bool known = std::find(current_.begin(), current_.end(), list) != current_.end();
-    if (!known && current_.size() < MOST_LISTS) current_.emplace_back(list);
+    if (!known && current_.size() < MAX_LISTS) current_.emplace_back(list);
 }
 
 void ReadLists::tree_changed(const std::function<bool(const std::string &list)> &same)

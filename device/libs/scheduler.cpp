@@ -56,7 +56,7 @@ std::string listed_name(int number)
 
 int count_of(const std::string &list)
 {
-    return std::clamp(xml_get_int((list + "/count").c_str()), 0, StorePath::HIGHEST_INDEX);
+    return std::clamp(xml_get_int((list + "/count").c_str()), 0, StorePath::MAX_INDEX);
 }
 
 bool set(const std::string &path, const char *text)

@@ -23,7 +23,7 @@ char *pss = nullptr;
 namespace
 {
 
-constexpr std::size_t LONGEST_TEXT = 1024;
+constexpr std::size_t MAX_TEXT = 1024;
 
 using Bytes = std::vector<char>;
 
@@ -52,7 +52,7 @@ std::optional<Bytes> read_share(int number)
     const std::string item = SHARES + "/item:" + std::to_string(number);
     const auto name = store_text(item + "/name");
     const auto path = store_text(item + "/path");
-    if (!name || !path || name->size() > LONGEST_TEXT || path->size() > LONGEST_TEXT) return std::nullopt;
+    if (!name || !path || name->size() > MAX_TEXT || path->size() > MAX_TEXT) return std::nullopt;
     Bytes record(SHARE_NEXT + sizeof(char *), '\0');
     put_text(record, SHARE_NAME, *name);
     put_text(record, SHARE_PATH, *path);

@@ -1,7 +1,8 @@
 #include "store_path.h"
 
+#include "common/text.h"
+
 #include <algorithm>
-#include <charconv>
 
 namespace device
 {
@@ -14,10 +15,8 @@ bool parse_step(std::string_view text, Step &step)
     step = {text.substr(0, colon), 0};
     if (!is_node_name(step.name)) return false;
     if (colon == std::string_view::npos) return true;
-    const std::string_view number = text.substr(colon + 1);
-    const char *const end = number.data() + number.size();
-    const auto [stop, error] = std::from_chars(number.data(), end, step.index);
-    return error == std::errc() && stop == end && step.index >= 1 && step.index <= StorePath::HIGHEST_INDEX;
+    step.index = bakjob::whole_number(text.substr(colon + 1), 1, StorePath::MAX_INDEX).value_or(0);
+    return step.index > 0;
 }
 
 } // namespace
@@ -54,7 +53,7 @@ StorePath parse_store_path(std::string_view text)
     while (!text.empty()) {
         text.remove_prefix(1);
         const std::size_t length = std::min(text.find('/'), text.size());
-        if (path.depth == StorePath::MOST_STEPS) return {};
+        if (path.depth == StorePath::MAX_STEPS) return {};
         if (!parse_step(text.substr(0, length), path.steps[path.depth])) return {};
         ++path.depth;
         text.remove_prefix(length);

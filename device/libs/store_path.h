@@ -16,10 +16,10 @@ struct Step {
 };
 
 struct StorePath {
-    static constexpr std::size_t MOST_STEPS = 16;
-    static constexpr int HIGHEST_INDEX = 1'000'000; // setting a node creates all before it
+    static constexpr std::size_t MAX_STEPS = 16;
+    static constexpr int MAX_INDEX = 1'000'000; // setting a node creates all before it
 
-    std::array<Step, MOST_STEPS> steps;
+    std::array<Step, MAX_STEPS> steps;
     std::size_t depth = 0; // 0: malformed
 
     [[nodiscard]] std::span<const Step> used() const { return {steps.data(), depth}; }

@@ -15,7 +15,7 @@ constexpr const char *ROOT_NAME = "config";
 
 // Written with one blank for each level, a tree of a few kilobytes that is nested further and further takes
 // gigabytes.
-constexpr int MOST_LEVELS = 100;
+constexpr int MAX_LEVELS = 100;
 
 // Values keep every byte: no trimming, no conversion of line ends. What a person adds by hand stays as well.
 constexpr unsigned PARSE_FLAGS = pugi::parse_cdata | pugi::parse_escapes | pugi::parse_ws_pcdata_single |
@@ -33,7 +33,7 @@ bool is_too_deep(const pugi::xml_document &document)
     xml_node node = document.first_child();
     while (node) {
         if (const xml_node child = node.first_child()) {
-            if (++level > MOST_LEVELS) return true;
+            if (++level > MAX_LEVELS) return true;
             node = child;
             continue;
         }

@@ -38,7 +38,9 @@ std::string remote_config_copy(const JobName &job);
 inline constexpr const char *DISCOVERY_CONFIG_COPY = "/tmp/remote_rinfo.txt";
 inline constexpr const char *DISCOVERY_LOCK_FILE = "/tmp/remote_rinfo.lock";
 
-inline constexpr int MOST_SNAPSHOTS = 10; // of a job; a recover run names one of so many
+// Snapshots that a job keeps. A recover run names one of so many.
+inline constexpr int MIN_SNAPSHOTS = 3;
+inline constexpr int MAX_SNAPSHOTS = 10;
 
 // Name of a snapshot folder inside the job's local folder: the job's name (or "backup") and the number, 0 the
 // newest, with a full stop between them.

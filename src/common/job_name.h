@@ -3,12 +3,15 @@
 // A job's name that may stand in commands and in names of files. It is checked once, where it comes in;
 // whoever composes either asks for one by its signature.
 
+#include <cstddef>
 #include <optional>
 #include <string>
 #include <string_view>
 
 namespace bakjob
 {
+
+inline constexpr std::size_t JOB_NAME_SIZE = 128; // bytes of a name, terminator included
 
 class JobName
 {

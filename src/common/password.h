@@ -8,10 +8,12 @@ namespace bakjob
 {
 
 inline constexpr std::size_t PASSWORD_SIZE = 128; // bytes of a password field, terminator included
+inline constexpr std::size_t MAX_ENCODED_PASSWORD =
+    (PASSWORD_SIZE - 1) / 4 * 3; // whose base64 text fits there
 inline constexpr const char *DEFAULT_DAEMON_PASSWORD = "pakto";
 
 // The length of the base64 text of `source` written to `destination` with its terminator, or -1 when it does
-// not fit in `size` bytes: up to 93 characters fit PASSWORD_SIZE.
+// not fit in `size` bytes: up to MAX_ENCODED_PASSWORD bytes fit PASSWORD_SIZE.
 int password_encode(char *destination, const char *source, std::size_t size);
 
 // The number of bytes decoded into `destination`, without a terminator: the caller zeroes it beforehand. -1

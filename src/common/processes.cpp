@@ -1,10 +1,10 @@
 #include "common/processes.h"
 
+#include "common/text.h"
+
 #include <algorithm>
 #include <cerrno>
-#include <charconv>
 #include <cstdio>
-#include <cstring>
 #include <dirent.h>
 #include <fstream>
 #include <memory>
@@ -74,10 +74,9 @@ std::vector<Process> running_processes()
     if (!folder) throw std::system_error(errno, std::generic_category(), "/proc");
     std::vector<Process> all;
     while (const dirent *const entry = readdir(folder.get())) {
-        pid_t id = 0;
-        const char *const end = entry->d_name + std::strlen(entry->d_name);
-        if (std::from_chars(entry->d_name, end, id).ptr != end) continue;
-        if (const auto process = read_process(id)) all.push_back(*process);
+        const auto id = whole_number<pid_t>(entry->d_name);
+        const auto process = id ? read_process(*id) : std::nullopt;
+        if (process) all.push_back(*process);
     }
     return all;
 }

@@ -1,5 +1,6 @@
 #include "common/shell_text.h"
 
+#include "common/job_name.h"
 #include "common/text.h"
 
 #include <algorithm>
@@ -10,7 +11,6 @@ namespace bakjob
 namespace
 {
 
-constexpr std::size_t JOB_NAME_LENGTH = 127;
 constexpr std::string_view LEFT_TO_THE_SHELL = "\"\\|<>*?";        // by escape_path
 constexpr std::string_view SHELL_SPECIAL = "\"\\|<>*?$`&(){};[]'"; // anywhere in a word
 constexpr std::string_view SPECIAL_IN_FRONT = "#~=^%";             // of a word, to one shell or another
@@ -60,7 +60,7 @@ std::string with_backslashes(std::string_view text, std::string_view before)
 
 bool is_job_name(std::string_view name)
 {
-    return !name.empty() && name.size() <= JOB_NAME_LENGTH && name != "." && name != ".." &&
+    return !name.empty() && name.size() < JOB_NAME_SIZE && name != "." && name != ".." &&
            !holds_control(name) && !holds_any(name, LEFT_TO_THE_SHELL) && !contains(name, "/");
 }
 

@@ -5,12 +5,14 @@
 
 #include "common/fixed_text.h"
 
+#include <charconv>
 #include <cstdarg>
 #include <cstddef>
 #include <cstdio>
 #include <optional>
 #include <string>
 #include <string_view>
+#include <system_error>
 
 namespace bakjob
 {
@@ -44,6 +46,24 @@ bool read_line(std::FILE *file, std::string &line);
 
 // The first blank-separated word of a text, which it leaves in front of what follows; empty at the end.
 std::string_view next_word(std::string_view &text);
+
+// The number that the whole text is: digits, and for a signed one perhaps a minus sign. Nullopt for any other
+// text, and for a number that does not fit.
+template <class Number>
+std::optional<Number> whole_number(std::string_view text)
+{
+    Number number = 0;
+    const char *const end = text.data() + text.size();
+    const auto [stop, error] = std::from_chars(text.data(), end, number);
+    return error == std::errc() && stop == end ? std::optional<Number>(number) : std::nullopt;
+}
+
+// The same for one that must lie within lowest..highest.
+inline std::optional<int> whole_number(std::string_view text, int lowest, int highest)
+{
+    const auto number = whole_number<int>(text);
+    return number && *number >= lowest && *number <= highest ? number : std::nullopt;
+}
 
 // Removes trailing white space and control characters (those of the C locale) in place.
 void trim_right(char *text);

@@ -26,7 +26,7 @@ namespace
 using std::chrono::milliseconds;
 
 constexpr mode_t LOCK_MODE = 0600;
-constexpr int MOST_TRIES = 1000; // against somebody who puts something there again and again
+constexpr int MAX_TRIES = 1000; // against somebody who puts something there again and again
 constexpr milliseconds BETWEEN_LOOKS(5);
 constexpr milliseconds UNTOLD_WAIT(1000);
 constexpr milliseconds LINKED_WAIT(5000); // longer than a save and its way to flash
@@ -137,7 +137,7 @@ UniqueFd take_lock(const char *path)
 {
     milliseconds patience = LINKED_WAIT;
     UniqueFd neighbours;
-    for (int tries = 0; tries < MOST_TRIES; ++tries) {
+    for (int tries = 0; tries < MAX_TRIES; ++tries) {
         UniqueFd lock = neighbours ? UniqueFd() : open_lock(path);
         if (!lock) lock = make_lock(path, patience, neighbours);
         neighbours.reset();

@@ -1,6 +1,7 @@
 #include "config/job.h"
 
 #include "common/debug_log.h"
+#include "common/job_files.h"
 #include "common/text.h"
 
 #include <algorithm>
@@ -19,17 +20,17 @@ static_assert(std::is_standard_layout_v<RsyncJob>, "fields are found by their of
 #define TEXT(name) .key = #name, .offset = offsetof(RsyncJob, name), .size = sizeof(RsyncJob::name)
 
 constexpr std::array FIELDS = {
-    JobField{INTEGER(enable)},
+    JobField{INTEGER(enable), .lowest = 0, .highest = 1},
     JobField{INTEGER(state)},
     JobField{INTEGER(pwd_encoded)},
-    JobField{INTEGER(server_type)},
-    JobField{INTEGER(backup_type)},
-    JobField{INTEGER(rsync_mode)},
-    JobField{INTEGER(schedule_mode)},
-    JobField{INTEGER(use_ssh)},
-    JobField{INTEGER(keep_exist_file)},
-    JobField{INTEGER(inc_enable)},
-    JobField{INTEGER(inc_number)},
+    JobField{INTEGER(server_type), .lowest = SERVER_SAME_KIND, .highest = SERVER_ANY},
+    JobField{INTEGER(backup_type), .lowest = BACKUP_PUSH, .highest = BACKUP_PULL},
+    JobField{INTEGER(rsync_mode), .lowest = RSYNC_MODE_SHELL, .highest = RSYNC_MODE_DAEMON},
+    JobField{INTEGER(schedule_mode), .lowest = SCHEDULE_TIMETABLE, .highest = SCHEDULE_EVENT},
+    JobField{INTEGER(use_ssh), .lowest = 0, .highest = 1},
+    JobField{INTEGER(keep_exist_file), .lowest = EXISTING_MIRROR, .highest = EXISTING_UPDATE},
+    JobField{INTEGER(inc_enable), .lowest = 0, .highest = 1},
+    JobField{INTEGER(inc_number), .lowest = MIN_SNAPSHOTS, .highest = MAX_SNAPSHOTS},
     JobField{INTEGER(retry), .lowest = 0, .highest = 15, .otherwise = 0},
     JobField{INTEGER(retry_interval), .lowest = 1, .highest = 180, .otherwise = 30},
     JobField{INTEGER(rsync_timeout), .lowest = 0, .highest = INT_MAX, .otherwise = 600},
@@ -58,6 +59,12 @@ constexpr std::array FIELDS = {
 std::span<const JobField> job_fields()
 {
     return FIELDS;
+}
+
+const JobField &job_field(std::string_view key)
+{
+    return *std::find_if(FIELDS.begin(), FIELDS.end(),
+                         [&](const JobField &field) { return field.key == key; });
 }
 
 std::int32_t &integer_field(RsyncJob &job, const JobField &field)
@@ -106,7 +113,7 @@ void forget_whole_text(RsyncJob &job, std::string_view key)
 void rsync_copy_job(RsyncJob &destination, const RsyncJob &source)
 {
     for (const JobField &field : FIELDS) {
-        if (field.size == 0) {
+        if (!field.is_text()) {
             integer_field(destination, field) = integer_field(source, field);
         } else {
             copy_text(text_field(destination, field), field.size, text_field(source, field));
@@ -117,7 +124,7 @@ void rsync_copy_job(RsyncJob &destination, const RsyncJob &source)
 
 int snapshots_kept(int inc_number)
 {
-    return std::clamp(inc_number, 3, 10);
+    return std::clamp(inc_number, MIN_SNAPSHOTS, MAX_SNAPSHOTS);
 }
 
 } // namespace bakjob

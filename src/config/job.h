@@ -3,6 +3,7 @@
 // One backup job as it stands in memory: a flat record whose fields carry the names of the job's keys in the
 // configuration store. Texts always hold a terminated string and never more than their size.
 
+#include "common/job_name.h"
 #include "common/password.h"
 #include "common/refusal.h"
 
@@ -12,6 +13,7 @@
 #include <functional>
 #include <map>
 #include <memory>
+#include <optional>
 #include <span>
 #include <string>
 #include <string_view>
@@ -19,13 +21,20 @@
 namespace bakjob
 {
 
-inline constexpr std::size_t JOB_NAME_SIZE = 128;
 inline constexpr const char *DEFAULT_PORT = "873";
+inline constexpr int MAX_PORT = 65535;
 
 enum ServerType : std::int32_t { SERVER_SAME_KIND = 1, SERVER_ANY = 2 };
 enum BackupType : std::int32_t { BACKUP_PUSH = 1, BACKUP_PULL = 2 };
 enum ScheduleMode : std::int32_t { SCHEDULE_TIMETABLE = 1, SCHEDULE_ONCE = 2, SCHEDULE_EVENT = 3 };
 enum RsyncMode : std::int32_t { RSYNC_MODE_SHELL = 1, RSYNC_MODE_DAEMON = 2 };
+
+// What becomes of files that the receiving side has already. Any other number mirrors, too.
+enum ExistingFiles : std::int32_t {
+    EXISTING_MIRROR = 0, // updated, and deleted when the sending side does not have them
+    EXISTING_KEEP = 1,   // left alone
+    EXISTING_UPDATE = 2  // updated; nothing is deleted
+};
 
 // Texts of a job, by key, of which the store has more than the job's field holds.
 using WholeTexts = std::map<std::string, std::string, std::less<>>;
@@ -39,12 +48,11 @@ struct RsyncJob {
     std::int32_t rsync_mode;
     std::int32_t schedule_mode;
     std::int32_t use_ssh;
-    std::int32_t
-        keep_exist_file; // 1: existing files are left alone, 2: and nothing is deleted, else deletion
+    std::int32_t keep_exist_file;
     std::int32_t inc_enable;
     std::int32_t inc_number;
-    std::int32_t retry;          // attempts, 0..15
-    std::int32_t retry_interval; // seconds, 1..180
+    std::int32_t retry;          // attempts
+    std::int32_t retry_interval; // seconds
     std::int32_t rsync_timeout;  // seconds, 0 for none
     char last_do_job_time[32];
     char job_name[JOB_NAME_SIZE];
@@ -69,14 +77,20 @@ struct RsyncJob {
 struct JobField {
     const char *key;
     std::size_t offset;
-    std::size_t size;     // bytes of a text; 0: an integer
-    int lowest = INT_MIN; // an integer outside of lowest..highest is loaded as `otherwise`
+    std::size_t size;     // bytes of a text, terminator included; 0: an integer
+    int lowest = INT_MIN; // lowest..highest is what an integer is meant to hold
     int highest = INT_MAX;
-    int otherwise = 0;
-    bool in_commands = false; // a text that becomes part of a command or names a file
+    std::optional<int> otherwise = std::nullopt; // what another integer is loaded as; nullopt: as it is
+    bool in_commands = false;                    // a text that becomes part of a command or names a file
+
+    [[nodiscard]] bool is_text() const { return size != 0; }
+    [[nodiscard]] bool in_range(int value) const { return value >= lowest && value <= highest; }
 };
 
 std::span<const JobField> job_fields();
+
+// The field of a key that there is.
+const JobField &job_field(std::string_view key);
 
 std::int32_t &integer_field(RsyncJob &job, const JobField &field);
 char *text_field(RsyncJob &job, const JobField &field);
@@ -100,7 +114,7 @@ void forget_whole_text(RsyncJob &job, std::string_view key);
 // Copies every field but `next`.
 void rsync_copy_job(RsyncJob &destination, const RsyncJob &source);
 
-// Snapshots that an incremental job keeps: its `inc_number` brought within 3 to 10.
+// Snapshots that an incremental job keeps: its `inc_number` brought within MIN_SNAPSHOTS to MAX_SNAPSHOTS.
 int snapshots_kept(int inc_number);
 
 } // namespace bakjob

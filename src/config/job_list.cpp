@@ -52,28 +52,38 @@ RsyncJob *rsync_new_job()
     return new (std::nothrow) RsyncJob{};
 }
 
-int rsync_list_add_job(const RsyncJob &source)
+int rsync_list_add_job(RsyncJobList &jobs, const RsyncJob &source)
 {
-    if (rsync_find_job(source.job_name) != nullptr) return 0;
+    if (rsync_find_job(jobs, source.job_name) != nullptr) return 0;
     std::unique_ptr<RsyncJob> job(rsync_new_job());
     if (!job) return 0;
     rsync_copy_job(*job, source);
-    rsync_list_take_job(std::move(job));
+    rsync_list_take_job(jobs, std::move(job));
     return 1;
 }
 
-void rsync_list_take_job(std::unique_ptr<RsyncJob> job)
+int rsync_list_add_job(const RsyncJob &source)
+{
+    return rsync_list_add_job(*job_list, source);
+}
+
+void rsync_list_take_job(RsyncJobList &jobs, std::unique_ptr<RsyncJob> job)
 {
     apply_defaults(*job);
-    job_list->append(job.release());
+    jobs.append(job.release());
+}
+
+RsyncJob *rsync_find_job(const RsyncJobList &jobs, std::string_view job_name)
+{
+    for (RsyncJob *job = jobs.head; job != nullptr; job = job->next) {
+        if (job_name == job->job_name) return job;
+    }
+    return nullptr;
 }
 
 RsyncJob *rsync_find_job(std::string_view job_name)
 {
-    for (RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
-        if (job_name == job->job_name) return job;
-    }
-    return nullptr;
+    return rsync_find_job(*job_list, job_name);
 }
 
 int rsync_list_remove_job(RsyncJob *job)

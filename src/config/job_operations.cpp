@@ -2,9 +2,14 @@
 
 #include "common/job_files.h"
 #include "config/config_lock.h"
+#include "config/job_change.h"
 #include "config/job_list.h"
 #include "config/job_store.h"
 #include "config/schedule.h"
+#include "config/unrecorded_state.h"
+
+#include <functional>
+#include <string_view>
 
 namespace bakjob
 {
@@ -13,26 +18,35 @@ namespace
 {
 
 // A save that fails is not the operations' to tell.
-int change_jobs(const std::function<bool()> &change)
+int answer_of(const JobChange &made)
 {
-    const JobChange made = rsync_change_jobs(change);
-    return made == JobChange::SAVED || made == JobChange::NOT_SAVED ? 1 : 0;
+    return made.result == ChangeResult::SAVED || made.result == ChangeResult::NOT_SAVED ? 1 : 0;
 }
 
-int change_job(const std::string &job_name, const std::function<bool(RsyncJob &)> &change)
+JobChange change_job(const std::string &job_name,
+                     const std::function<bool(RsyncJobList &jobs, RsyncJob &job)> &change)
 {
-    return change_jobs([&] {
-        RsyncJob *const job = rsync_find_job(job_name);
-        return job != nullptr && change(*job);
+    return rsync_change_jobs([&](RsyncJobList &jobs) {
+        RsyncJob *const job = rsync_find_job(jobs, job_name);
+        return job != nullptr && change(jobs, *job);
     });
+}
+
+// Without a new name that a job can have, the state goes with the job.
+void move_unrecorded(const std::string &job_name, std::string_view new_name)
+{
+    const auto from = JobName::checked(job_name);
+    const auto to = JobName::checked(new_name);
+    if (from && to) rsync_rename_unrecorded(*from, *to);
+    if (from && !to) rsync_forget_unrecorded(*from);
 }
 
 int set_enable(const std::string &job_name, int value)
 {
-    return change_job(job_name, [&](RsyncJob &job) {
+    return answer_of(change_job(job_name, [&](RsyncJobList &, RsyncJob &job) {
         job.enable = value;
         return true;
-    });
+    }));
 }
 
 int read_job(const std::string &job_name, const std::function<void(const RsyncJob &)> &read)
@@ -50,21 +64,6 @@ int read_job(const std::string &job_name, const std::function<void(const RsyncJo
 
 } // namespace
 
-JobChange rsync_change_jobs(const std::function<bool()> &change, WithoutLock without_lock)
-{
-    const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
-    if (!lock && without_lock == WithoutLock::REFUSE) return JobChange::NOT_LOCKED;
-    if (!rsync_load_jobs()) {
-        rsync_free_jobs();
-        return JobChange::NOT_LOADED;
-    }
-    if (!change()) {
-        rsync_free_jobs();
-        return JobChange::NONE;
-    }
-    return rsync_save_jobs() ? JobChange::SAVED : JobChange::NOT_SAVED;
-}
-
 int rsync_enable_job(const std::string &job_name)
 {
     return set_enable(job_name, 1);
@@ -77,21 +76,31 @@ int rsync_disable_job(const std::string &job_name)
 
 int rsync_add_job(const RsyncJob &job)
 {
-    return change_jobs([&] { return rsync_list_add_job(job) == 1; });
+    return answer_of(
+        rsync_change_jobs([&](RsyncJobList &jobs) { return rsync_list_add_job(jobs, job) == 1; }));
 }
 
 int rsync_modify_job(const RsyncJob &job, const std::string &job_name)
 {
-    return change_job(job_name, [&](RsyncJob &stored) {
+    bool first_of_its_name = false;
+    const JobChange made = change_job(job_name, [&](RsyncJobList &jobs, RsyncJob &stored) {
         if (stored.schedule_mode != SCHEDULE_TIMETABLE) rsync_remove_job_schedule(stored.job_name);
         rsync_copy_job(stored, job);
+        first_of_its_name = rsync_find_job(jobs, job.job_name) == &stored;
         return true;
     });
+    if (made.saved() && job_name != job.job_name) {
+        move_unrecorded(job_name, first_of_its_name ? job.job_name : "");
+    }
+    return answer_of(made);
 }
 
 int rsync_delete_job(const std::string &job_name)
 {
-    return change_job(job_name, [](RsyncJob &job) { return rsync_list_remove_job(&job) == 1; });
+    const JobChange made =
+        change_job(job_name, [](RsyncJobList &jobs, RsyncJob &job) { return jobs.remove(&job); });
+    if (made.saved()) move_unrecorded(job_name, "");
+    return answer_of(made);
 }
 
 int rsync_get_job(RsyncJob &job, const std::string &job_name)

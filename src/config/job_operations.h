@@ -7,27 +7,10 @@
 
 #include "config/job.h"
 
-#include <functional>
 #include <string>
 
 namespace bakjob
 {
-
-enum class JobChange {
-    NONE, // `change` did not want it
-    SAVED,
-    NOT_LOCKED, // no lock could be had (errno), nothing was done
-    NOT_LOADED, // rsync_load_failure tells why; nothing was done
-    NOT_SAVED   // a value could not be set, or the configuration file could not be written
-};
-
-// What a change does when the configuration lock cannot be had.
-enum class WithoutLock { GO_ON, REFUSE };
-
-// The cycle behind the operations, for a change that none of them makes: `change` works on the loaded job
-// list and says whether to save it. Nobody else changes a job meanwhile.
-JobChange rsync_change_jobs(const std::function<bool()> &change,
-                            WithoutLock without_lock = WithoutLock::GO_ON);
 
 // Change one job. Hold the configuration lock from the load to the save; block while another holds it.
 int rsync_enable_job(const std::string &job_name);
@@ -38,10 +21,11 @@ int rsync_add_job(const RsyncJob &job);
 
 // Puts `job` in the place of the job of that name, every field as given; a different `job_name` renames it.
 // A stored job without a timetable (`schedule_mode` not 1) loses its scheduler entry first. Renamed onto
-// another job's name, both are saved, and the next load keeps the first alone: look with rsync_job_exists.
+// another job's name, both are saved, and the next load keeps the first alone: look with rsync_job_exists. An
+// unrecorded state (unrecorded_state.h) goes along.
 int rsync_modify_job(const RsyncJob &job, const std::string &job_name);
 
-// Deletes the job and the scheduler entries that name it.
+// Deletes the job, the scheduler entries that name it and its unrecorded state.
 int rsync_delete_job(const std::string &job_name);
 
 // Read only; hold the lock while loading. rsync_get_job leaves `job` as it was when it answers 0.

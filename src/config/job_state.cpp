@@ -5,12 +5,9 @@
 #include "common/job_files.h"
 #include "common/run_options.h"
 #include "common/text.h"
-#include "config/config_lock.h"
-#include "config/job_list.h"
-#include "config/job_store.h"
+#include "config/job_change.h"
 #include "config/process_guard.h"
 #include "config/unrecorded_state.h"
-#include "platform/device.h"
 
 #include <cerrno>
 #include <cstring>
@@ -25,18 +22,9 @@ namespace bakjob
 namespace
 {
 
-bool saving = false; // and still true behind a save that threw
-
-// Whether the configuration has taken the states. One that could not be loaded whole may be damaged, and the
-// copy in flash may not be.
-bool save_and_commit()
-{
-    saving = true;
-    const bool saved = rsync_save_jobs();
-    saving = false;
-    if (rsync_load_failure() == nullptr) LIB_CP_Config_To_MTD(1);
-    return saved;
-}
+// A state has to be on record somewhere, so a failure on the way ends nothing.
+constexpr ChangeRules STATE_CHANGE = {
+    .needs_lock = false, .needs_all = false, .to_flash = ToFlash::WHEN_LOADED};
 
 // A state that is lost would leave the one before it to be believed.
 void keep_unrecorded(const std::string &job_name, StateKind kind, const UnrecordedState &state)
@@ -58,17 +46,27 @@ StateKind kind_of_run()
     return run_options.restore_mode != 0 ? StateKind::RESTORE : StateKind::BACKUP;
 }
 
-void set_state(RsyncJob &job, StateKind kind, JobState state, const char *now)
+void set_state(RsyncJob &job, StateKind kind, std::int32_t state, const std::string &time)
 {
     (kind == StateKind::RESTORE ? job.rstate : job.state) = state;
-    copy_text(kind == StateKind::RESTORE ? job.rlast_do_job_time : job.last_do_job_time, now);
+    copy_text(kind == StateKind::RESTORE ? job.rlast_do_job_time : job.last_do_job_time, time);
 }
 
-bool reset_if_stale(std::int32_t &state, char (&time)[JOB_TIME_SIZE], const char *now)
+// How a run ended that is recorded as going on and is not: as it has kept that itself, being unable to record
+// it, or else interrupted.
+UnrecordedState end_of_stale_run(const RsyncJob &job, StateKind kind, const char *now)
 {
-    if (rsync_state_is_running(state) == 0) return false;
-    state = JOB_INTERRUPTED;
-    copy_text(time, now);
+    const auto name = JobName::checked(job.job_name);
+    auto kept = name ? rsync_unrecorded_state(*name, kind) : std::nullopt;
+    if (kept && rsync_state_is_running(kept->state) == 0) return *std::move(kept);
+    return {JOB_INTERRUPTED, now};
+}
+
+bool reset_if_stale(RsyncJob &job, StateKind kind, const char *now)
+{
+    if (rsync_state_is_running(kind == StateKind::RESTORE ? job.rstate : job.state) == 0) return false;
+    const UnrecordedState end = end_of_stale_run(job, kind, now);
+    set_state(job, kind, end.state, end.time);
     return true;
 }
 
@@ -89,19 +87,21 @@ int rsync_state_is_running(std::int32_t state)
 
 void rsync_set_job_state(const std::string &job_name, JobState state)
 {
-    const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
-    const bool loaded = rsync_load_jobs();
-    RsyncJob *const job = rsync_find_job(job_name);
-    if (job == nullptr && loaded) {
-        rsync_free_jobs();
-        return;
-    }
     const StateKind kind = kind_of_run();
-    char now[JOB_TIME_SIZE] = "";
-    rsync_job_time(now);
-    const UnrecordedState as_set{state, now};
-    if (job != nullptr) set_state(*job, kind, state, now);
-    if (save_and_commit()) {
+    UnrecordedState as_set{state, {}};
+    const JobChange made = rsync_change_jobs(
+        [&](RsyncJobList &jobs) {
+            RsyncJob *const job = rsync_find_job(jobs, job_name);
+            if (job == nullptr && jobs.load_failure == nullptr) return false;
+            char now[JOB_TIME_SIZE] = "";
+            rsync_job_time(now);
+            as_set.time = now;
+            if (job != nullptr) set_state(*job, kind, state, now);
+            return true;
+        },
+        STATE_CHANGE);
+    if (made.result == ChangeResult::UNCHANGED) return;
+    if (made.saved()) {
         forget_unrecorded(job_name, kind);
     } else {
         keep_unrecorded(job_name, kind, as_set);
@@ -110,7 +110,7 @@ void rsync_set_job_state(const std::string &job_name, JobState state)
 
 void rsync_record_interruption(const std::string &job_name)
 {
-    if (!saving) {
+    if (!rsync_save_broken_off()) {
         try {
             rsync_free_jobs();
             rsync_set_job_state(job_name, JOB_INTERRUPTED);
@@ -125,30 +125,29 @@ void rsync_record_interruption(const std::string &job_name)
 
 void rsync_reset_stale_states()
 {
-    const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
-    rsync_load_jobs();
-    char now[JOB_TIME_SIZE] = "";
-    rsync_job_time(now);
     std::vector<std::pair<std::string, StateKind>> changed;
-    for (RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
-        // A name that no run can have has no pid file either.
-        const auto name = JobName::checked(job->job_name);
-        if (name && !rsync_pid_file_absent(*name)) continue;
-        if (reset_if_stale(job->state, job->last_do_job_time, now)) {
-            changed.emplace_back(job->job_name, StateKind::BACKUP);
-        }
-        if (reset_if_stale(job->rstate, job->rlast_do_job_time, now)) {
-            changed.emplace_back(job->job_name, StateKind::RESTORE);
-        }
-    }
-    if (changed.empty()) {
-        rsync_free_jobs();
-    } else if (save_and_commit()) {
-        for (const auto &[job_name, kind] : changed) {
-            forget_unrecorded(job_name, kind);
-        }
-    } else {
+    const JobChange made = rsync_change_jobs(
+        [&](RsyncJobList &jobs) {
+            char now[JOB_TIME_SIZE] = "";
+            rsync_job_time(now);
+            for (RsyncJob *job = jobs.head; job != nullptr; job = job->next) {
+                // A name that no run can have has no pid file either.
+                const auto name = JobName::checked(job->job_name);
+                if (name && !rsync_pid_file_absent(*name)) continue;
+                for (const StateKind kind : {StateKind::BACKUP, StateKind::RESTORE}) {
+                    if (reset_if_stale(*job, kind, now)) changed.emplace_back(job->job_name, kind);
+                }
+            }
+            return !changed.empty();
+        },
+        STATE_CHANGE);
+    if (made.result == ChangeResult::UNCHANGED) return;
+    if (!made.saved()) {
         DebugLog("ERROR: stale states are not reset: the configuration could not be written\n");
+        return;
+    }
+    for (const auto &[job_name, kind] : changed) {
+        forget_unrecorded(job_name, kind);
     }
 }
 

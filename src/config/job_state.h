@@ -41,7 +41,8 @@ void rsync_set_job_state(const std::string &job_name, JobState state);
 // beside the configuration (unrecorded_state.h).
 void rsync_record_interruption(const std::string &job_name);
 
-// Turns the running states of every job without a pid file into JOB_INTERRUPTED.
+// Turns the running states of every job without a pid file into JOB_INTERRUPTED, or into the final state that
+// the run has kept beside the configuration.
 void rsync_reset_stale_states();
 
 } // namespace bakjob

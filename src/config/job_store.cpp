@@ -24,7 +24,7 @@ namespace
 
 constexpr const char *JOBS = "/backup_mgr/rsync";
 constexpr const char *JOB_COUNT = "/backup_mgr/rsync/count";
-constexpr int LONGEST_GAP = 1000; // items that are not there, one behind the other
+constexpr int MAX_GAP = 1000; // items that are not there, one behind the other
 
 constexpr const char *UNREADABLE = "the configuration cannot be read";
 constexpr const char *WRONG_COUNT = "/backup_mgr/rsync/count is missing or below 1, but there are items";
@@ -33,8 +33,6 @@ constexpr const char *TWO_LISTS = "there are two lists of jobs, /backup_mgr/rsyn
 constexpr const char *SAME_NAME = "the names of two jobs begin with the same 127 bytes";
 constexpr const char *NO_MEMORY = "there is not enough memory";
 constexpr const char *LONG_TEXT = "a text of a job is longer than 1 MiB";
-
-const char *load_failure = nullptr;
 
 // The path of one key of one item; reused from key to key, as there are tens of thousands of them. Made
 // without memory of its own: a save that has begun must not end there.
@@ -85,10 +83,9 @@ bool load_job(RsyncJob &job, int item)
     WholeTexts whole_texts;
     for (const JobField &field : job_fields()) {
         const char *const key = path.key(field.key);
-        if (field.size == 0) {
+        if (!field.is_text()) {
             const int value = xml_get_int(key);
-            const bool in_range = value >= field.lowest && value <= field.highest;
-            integer_field(job, field) = in_range ? value : field.otherwise;
+            integer_field(job, field) = field.in_range(value) ? value : field.otherwise.value_or(value);
             found |= value != -1;
         } else {
             char *const text = text_field(job, field);
@@ -112,19 +109,21 @@ bool has_endless_text(const RsyncJob &job)
 class JobLoader
 {
 public:
+    explicit JobLoader(RsyncJobList &jobs) : jobs_(jobs) {}
+
     // Null, or why something is left out.
     const char *load()
     {
         const int count = xml_get_int(JOB_COUNT);
         int item = 1;
-        for (; item <= count && missing_ < LONGEST_GAP; ++item) {
+        for (; item <= count && missing_ < MAX_GAP; ++item) {
             try {
                 load_item(item);
             } catch (const std::bad_alloc &) {
                 failure_ = NO_MEMORY;
             }
         }
-        if (missing_ >= LONGEST_GAP) return GAP;
+        if (missing_ >= MAX_GAP) return GAP;
         if (is_unreadable(item)) return UNREADABLE;
         if (store_has(format_text("%s:2", JOBS))) return TWO_LISTS;
         // A count that is too low counts all the same: an earlier, longer list may have left what is behind.
@@ -141,18 +140,19 @@ private:
             return;
         }
         if (has_endless_text(*job)) failure_ = LONG_TEXT;
-        rsync_list_take_job(std::move(job));
+        rsync_list_take_job(jobs_, std::move(job));
     }
 
+    RsyncJobList &jobs_;
     std::unordered_set<std::string> names_; // of the listed jobs
     int missing_ = 0;
     const char *failure_ = nullptr;
 };
 
-const char *load_or_say_why()
+const char *load_or_say_why(RsyncJobList &jobs)
 {
     try {
-        return JobLoader().load();
+        return JobLoader(jobs).load();
     } catch (const std::bad_alloc &) {
         return NO_MEMORY;
     }
@@ -164,20 +164,20 @@ bool save_job(const RsyncJob &job, int item)
     bool set = true;
     for (const JobField &field : job_fields()) {
         const char *const key = path.key(field.key);
-        const int answer = field.size == 0 ? xml_set_int(key, integer_field(job, field))
-                                           : xml_set_str(key, text_to_save(job, field));
+        const int answer = field.is_text() ? xml_set_str(key, text_to_save(job, field))
+                                           : xml_set_int(key, integer_field(job, field));
         set &= answer != XML_UNREADABLE;
     }
     return set;
 }
 
 // Whether the store has taken all of them.
-bool save_list()
+bool save_list(const RsyncJobList &jobs)
 {
     bool set = xml_del(JOBS) != XML_UNREADABLE;
-    if (rsync_job_list_empty() == 0) set &= xml_set_int(JOB_COUNT, job_list->count) != XML_UNREADABLE;
+    if (jobs.count > 0) set &= xml_set_int(JOB_COUNT, jobs.count) != XML_UNREADABLE;
     int item = 0;
-    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+    for (const RsyncJob *job = jobs.head; job != nullptr; job = job->next) {
         set &= save_job(*job, ++item);
     }
     return set;
@@ -185,38 +185,40 @@ bool save_list()
 
 } // namespace
 
-bool rsync_load_jobs()
+bool rsync_load_jobs(RsyncJobList &jobs)
 {
-    rsync_free_jobs();
-    load_failure = load_or_say_why();
-    if (load_failure == nullptr) return true;
-    DebugLog("ERROR: jobs are left out: %s\n", load_failure);
+    jobs.clear();
+    jobs.load_failure = load_or_say_why(jobs);
+    if (jobs.load_failure == nullptr) return true;
+    DebugLog("ERROR: jobs are left out: %s\n", jobs.load_failure);
     return false;
 }
 
-const char *rsync_load_failure()
+bool rsync_load_jobs()
 {
-    return load_failure;
+    return rsync_load_jobs(*job_list);
 }
 
-bool rsync_save_jobs()
+bool rsync_save_jobs(RsyncJobList &jobs)
 {
-    if (load_failure != nullptr) {
-        DebugLog("ERROR: jobs are not saved: %s\n", load_failure);
-        rsync_free_jobs();
+    const char *why = jobs.load_failure;
+    if (why == nullptr && !save_list(jobs)) why = "a value could not be set";
+    if (why != nullptr) {
+        DebugLog("ERROR: jobs are not saved: %s\n", why);
+        jobs.clear();
         return false;
     }
-    if (!save_list()) {
-        DebugLog("ERROR: jobs are not saved: a value could not be set\n");
-        rsync_free_jobs();
-        return false;
-    }
-    const bool handed_over = rsync_prune_schedule();
-    rsync_free_jobs(); // before the write, which can use their memory
+    const bool handed_over = rsync_prune_schedule(jobs);
+    jobs.clear(); // before the write, which can use their memory
     if (xml_write_file(CONFIG_FILE) >= 0) return true;
     // The scheduler is not to go by what the file does not say.
     if (handed_over) rsync_apply_schedule();
     return false;
+}
+
+bool rsync_save_jobs()
+{
+    return rsync_save_jobs(*job_list);
 }
 
 } // namespace bakjob

@@ -3,7 +3,6 @@
 #include "common/text.h"
 
 #include <cstdint>
-#include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <sstream>
@@ -76,10 +75,10 @@ std::optional<LockHolder> flock_holder(int file)
     std::optional<LockHolder> holder;
     std::error_code none;
     for (const auto &entry : fs::directory_iterator("/proc", none)) {
-        const auto process = static_cast<pid_t>(std::strtol(entry.path().filename().c_str(), nullptr, 10));
-        if (process <= 0 || !has_locked(entry.path(), place)) continue;
+        const auto process = whole_number<pid_t>(entry.path().filename().native());
+        if (!process || !has_locked(entry.path(), place)) continue;
         const bool neighbour = stat(entry.path().c_str(), &status) != 0 || status.st_uid != geteuid();
-        if (!holder || !neighbour) holder = LockHolder{process, program_of(process), neighbour};
+        if (!holder || !neighbour) holder = LockHolder{*process, program_of(*process), neighbour};
     }
     return holder ? holder : listed_holder(place);
 }

@@ -10,7 +10,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <charconv>
 #include <fcntl.h>
 #include <fstream>
 #include <sys/file.h>
@@ -33,12 +32,9 @@ pid_t process_id_in(int file)
     char text[32] = "";
     const ssize_t length = pread(file, text, sizeof text, 0);
     if (length <= 0 || length == sizeof text) return 0;
-    const std::string_view content(text, static_cast<std::size_t>(length));
-    pid_t pid = 0;
-    const auto [end, error] = std::from_chars(content.data(), content.data() + content.size(), pid);
-    const std::string_view rest = content.substr(static_cast<std::size_t>(end - content.data()));
-    const bool whole = error == std::errc() && (rest.empty() || rest == "\n");
-    return whole && pid > 0 ? pid : 0;
+    std::string_view content(text, static_cast<std::size_t>(length));
+    if (content.ends_with('\n')) content.remove_suffix(1);
+    return std::max(whole_number<pid_t>(content).value_or(0), 0);
 }
 
 // Whoever removes a pid file locks it first, so that it does not become another one between the look and the

@@ -20,9 +20,8 @@ constexpr const char *GROUP = "rsync";
 constexpr const char *GROUP_NODE = "/system_mgr/crond/rsync";
 constexpr const char *ENTRY_COUNT = "/system_mgr/crond/rsync/count";
 constexpr const char *GROUP_COUNT = "/system_mgr/crond/list/count";
-constexpr std::size_t LONGEST_NAME = sizeof(RsyncJob::job_name) - 1;
-constexpr std::size_t TEXT_SIZE = 256; // bytes of a group's name and of a command, terminator included
-constexpr int MOST_ENTRIES = 10'000;
+constexpr std::size_t TEXT_SIZE = MAX_SCHEDULED_COMMAND + 1; // of a group's name or a command
+constexpr int MAX_ENTRIES = 10'000;
 
 struct EntryKey {
     const char *key;
@@ -45,7 +44,7 @@ struct Group {
 int bounded_count(const char *path)
 {
     const int count = xml_get_int(path);
-    if (count <= MOST_ENTRIES) return count;
+    if (count <= MAX_ENTRIES) return count;
     DebugLog("ERROR: [%s] refused: %d\n", path, count);
     return 0;
 }
@@ -132,10 +131,10 @@ void delete_group(const Group &group)
 
 using Names = std::unordered_set<std::string_view>;
 
-Names listed_names()
+Names names_of(const RsyncJobList &jobs)
 {
     Names names;
-    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+    for (const RsyncJob *job = jobs.head; job != nullptr; job = job->next) {
         names.insert(job->job_name);
     }
     return names;
@@ -146,7 +145,7 @@ Names listed_names()
 bool names_one_of(const Names &names, std::string_view command)
 {
     for (std::size_t open = command.find('\''); open < command.size(); open = command.find('\'', open + 1)) {
-        const std::string_view rest = command.substr(open + 1, LONGEST_NAME + 1);
+        const std::string_view rest = command.substr(open + 1, JOB_NAME_SIZE);
         for (std::size_t close = rest.find('\''); close < rest.size(); close = rest.find('\'', close + 1)) {
             if (names.contains(rest.substr(0, close))) return true;
         }
@@ -193,36 +192,41 @@ int first_entry_holding(const char *job_name, int entries)
 
 int rsync_schedule_names_job(std::string_view command)
 {
-    return names_one_of(listed_names(), command) ? 1 : 0;
+    return names_one_of(names_of(*job_list), command) ? 1 : 0;
 }
 
 // A command that was cut may name a job behind the cut, so it is not judged.
-bool rsync_prune_schedule()
+bool rsync_prune_schedule(const RsyncJobList &jobs)
 {
-    const Names listed = listed_names();
+    const Names listed = names_of(jobs);
     const int deleted = delete_entries(
         [&](const std::string &command) { return !is_cut(command) && !names_one_of(listed, command); });
     if (deleted > 0) LIB_do_ctc();
     return deleted > 0;
 }
 
-bool rsync_schedules_job(std::string_view command, std::string_view job_name)
+bool rsync_prune_schedule()
+{
+    return rsync_prune_schedule(*job_list);
+}
+
+bool rsync_schedules_job(const RsyncJobList &jobs, std::string_view command, std::string_view job_name)
 {
     if (!names(command, job_name)) return false;
-    for (const RsyncJob *job = job_list->head; job != nullptr; job = job->next) {
+    for (const RsyncJob *job = jobs.head; job != nullptr; job = job->next) {
         const std::string_view other = job->job_name;
         if (other.size() > job_name.size() && names(command, other)) return false;
     }
     return true;
 }
 
-std::vector<ScheduleEntry> rsync_job_schedule(std::string_view job_name)
+std::vector<ScheduleEntry> rsync_job_schedule(const RsyncJobList &jobs, std::string_view job_name)
 {
     std::vector<ScheduleEntry> found;
     const int entries = find_group().name_path.empty() ? 0 : bounded_count(ENTRY_COUNT);
     for (int entry = 1; entry <= entries; ++entry) {
-        if (rsync_schedules_job(whole_entry_command(entry), job_name))
-            found.push_back(read_entry(entry_path(entry)));
+        if (!rsync_schedules_job(jobs, whole_entry_command(entry), job_name)) continue;
+        found.push_back(read_entry(entry_path(entry)));
     }
     return found;
 }
@@ -247,7 +251,7 @@ bool rsync_add_schedule(const ScheduleEntry &entry)
     const int groups = std::max(xml_get_int(GROUP_COUNT), 0);
     const int entries = std::max(xml_get_int(ENTRY_COUNT), 0);
     const std::string path = entry_path(entries + 1);
-    if (std::max(groups, entries) >= MOST_ENTRIES) return false;
+    if (std::max(groups, entries) >= MAX_ENTRIES) return false;
     if (store_has(path)) return false;
     if (group.name_path.empty() && store_has(group_name_path(groups + 1))) return false;
     const bool added = write_entry(path, entry) && (!group.name_path.empty() || list_group(groups + 1)) &&
@@ -256,9 +260,10 @@ bool rsync_add_schedule(const ScheduleEntry &entry)
     return added;
 }
 
-int rsync_unschedule_job(std::string_view job_name)
+int rsync_unschedule_job(const RsyncJobList &jobs, std::string_view job_name)
 {
-    return delete_entries([&](const std::string &command) { return rsync_schedules_job(command, job_name); });
+    return delete_entries(
+        [&](const std::string &command) { return rsync_schedules_job(jobs, command, job_name); });
 }
 
 void rsync_remove_job_schedule(const char *job_name)

@@ -2,6 +2,10 @@
 
 // The scheduler's entries for backup jobs: the group "rsync" of the scheduler's part of the configuration
 // store. An entry names its job in the command that it runs.
+//
+// A function without a job list as its argument goes by the process's one list.
+
+#include "config/job_list.h"
 
 #include <string>
 #include <string_view>
@@ -10,21 +14,24 @@
 namespace bakjob
 {
 
+// Bytes of the longest command that an entry is made with.
+inline constexpr std::size_t MAX_SCHEDULED_COMMAND = 255;
+
 // When an entry runs, in cron's notation, and what.
 struct ScheduleEntry {
     std::string minute, hour, day, month, weekday, user, run;
 };
 
-// The entries of a job: their command holds its name in single quotes, and that of no job of the job list
-// with a longer name.
-std::vector<ScheduleEntry> rsync_job_schedule(std::string_view job_name);
+// The entries of a job: their command holds its name in single quotes, and that of no listed job with a
+// longer name.
+std::vector<ScheduleEntry> rsync_job_schedule(const RsyncJobList &jobs, std::string_view job_name);
 
 // Deletes them; how many there were. The configuration file is the caller's to write, and then the
 // scheduler's to take over by rsync_apply_schedule.
-int rsync_unschedule_job(std::string_view job_name);
+int rsync_unschedule_job(const RsyncJobList &jobs, std::string_view job_name);
 
 // Whether an entry with this command is one of them.
-bool rsync_schedules_job(std::string_view command, std::string_view job_name);
+bool rsync_schedules_job(const RsyncJobList &jobs, std::string_view command, std::string_view job_name);
 
 // Every entry of the scheduler, those of other groups than the backup jobs' as well.
 std::vector<ScheduleEntry> rsync_all_schedules();
@@ -33,12 +40,13 @@ std::vector<ScheduleEntry> rsync_all_schedules();
 // not take it, or has more entries than their count says, one of which it would replace.
 bool rsync_add_schedule(const ScheduleEntry &entry);
 
-// Deletes the entries that name no job of the job list; the last one left takes the group with it. Does not
-// write the configuration file: the save that it is part of does. Whether anything was deleted, and with that
-// the scheduler told.
+// Deletes the entries that name no listed job; the last one left takes the group with it. Does not write the
+// configuration file: the save that it is part of does. Whether anything was deleted, and with that the
+// scheduler told.
+bool rsync_prune_schedule(const RsyncJobList &jobs);
 bool rsync_prune_schedule();
 
-// 1 when the command holds the name of a job of the list in single quotes, else 0.
+// 1 when the command holds the name of a listed job in single quotes, else 0.
 int rsync_schedule_names_job(std::string_view command);
 
 // Deletes the first entry whose command holds the name anywhere, and then writes the configuration file.

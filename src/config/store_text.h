@@ -28,8 +28,8 @@ inline bool store_has(const std::string &path)
     return start[0] != UNTOUCHED;
 }
 
-// Bytes, and one for its end, of the longest text that is read whole.
-inline constexpr std::size_t LONGEST_TEXT = 1U << 20U;
+// Bytes, terminator included, of the longest text that is read whole.
+inline constexpr std::size_t MAX_TEXT_SIZE = 1U << 20U;
 
 // The text at `path` however long it is; of one that is_cut only the start.
 inline std::string whole_text(const std::string &path)
@@ -39,14 +39,14 @@ inline std::string whole_text(const std::string &path)
     do {
         size *= 4;
         text = store_text(path, size);
-    } while (text.size() == size - 1 && size < LONGEST_TEXT);
+    } while (text.size() == size - 1 && size < MAX_TEXT_SIZE);
     return text;
 }
 
 // Whether a text from whole_text may go on in the store.
 inline bool is_cut(const std::string &text)
 {
-    return text.size() >= LONGEST_TEXT - 1;
+    return text.size() >= MAX_TEXT_SIZE - 1;
 }
 
 // Whether the store took the text.

@@ -6,7 +6,7 @@
 
 #include <algorithm>
 #include <array>
-#include <charconv>
+#include <cstdio>
 #include <fcntl.h>
 #include <unistd.h>
 
@@ -57,13 +57,10 @@ std::optional<UnrecordedState> rsync_unrecorded_state(const JobName &job, StateK
         std::string_view line = rest.substr(0, rest.find('\n'));
         rest.remove_prefix(std::min(rest.size(), line.size() + 1));
         if (next_word(line) != key_of(kind)) continue;
-        const std::string_view number = next_word(line);
-        UnrecordedState state{};
-        const char *const end = number.data() + number.size();
-        if (std::from_chars(number.data(), end, state.state).ptr != end || number.empty()) continue;
+        const auto state = whole_number<std::int32_t>(next_word(line));
+        if (!state) continue;
         line.remove_prefix(std::min(line.size(), line.find_first_not_of(' ')));
-        state.time = line;
-        return state;
+        return UnrecordedState{*state, std::string(line)};
     }
     return std::nullopt;
 }
@@ -77,6 +74,18 @@ void rsync_forget_unrecorded(const JobName &job, StateKind kind)
         if (kept && replace_file(path, 0600, line_of(other, *kept))) return;
     }
     unlink(path.c_str());
+}
+
+void rsync_forget_unrecorded(const JobName &job)
+{
+    unlink(unrecorded_file(job).c_str());
+}
+
+void rsync_rename_unrecorded(const JobName &job, const JobName &new_name)
+{
+    if (std::rename(unrecorded_file(job).c_str(), unrecorded_file(new_name).c_str()) == 0) return;
+    rsync_forget_unrecorded(new_name);
+    rsync_forget_unrecorded(job);
 }
 
 } // namespace bakjob

@@ -23,10 +23,16 @@ struct UnrecordedState {
 // Keeps it in place of an earlier one of its kind. False (errno) when that cannot be written either.
 bool rsync_keep_unrecorded(const JobName &job, StateKind kind, const UnrecordedState &state);
 
-// Nothing when the configuration has the job's state of that kind.
+// Nullopt when the configuration has the job's state of that kind.
 std::optional<UnrecordedState> rsync_unrecorded_state(const JobName &job, StateKind kind);
 
 // To be called when the configuration has taken a state of that kind.
 void rsync_forget_unrecorded(const JobName &job, StateKind kind);
+
+// To be called when the job is deleted.
+void rsync_forget_unrecorded(const JobName &job);
+
+// To be called when the job gets another name, in the place of whatever an earlier job of that name has left.
+void rsync_rename_unrecorded(const JobName &job, const JobName &new_name);
 
 } // namespace bakjob
