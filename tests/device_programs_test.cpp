@@ -1,12 +1,12 @@
 // The stand-in programs, against the real rsync daemon and the real ssh server of the remote side.
 
-#include "support.h"
+#include "process_support.h"
 
 #include <algorithm>
-#include <string>
-#include <sys/types.h>
-#include <utility>
-#include <vector>
+#include <filesystem>
+#include <unistd.h>
+
+namespace fs = std::filesystem;
 
 namespace
 {
@@ -154,6 +154,85 @@ TEST_F(Programs, PsShowsOneLineAProcessOfAnyLength)
         processes = shell("ps -ww").output;
         return count_lines(processes, {"sleep 5; : \"a b\" zzz", "zzz end"}) == 1;
     })) << processes.substr(0, 2000);
+}
+
+constexpr const char *BOUND = "BAKJOB_RUN=1 DEVICE_PROBE_SECONDS=1 ";
+
+TEST_F(Programs, AProbeEndsWhateverGoesOnForEver)
+{
+    // One byte in a while, and lines without end behind a greeting.
+    const BadServer drips(
+        [](int c) {
+            while (write(c, "x", 1) == 1)
+                usleep(200'000);
+        },
+        8731);
+    const BadServer lists(
+        [](int c) {
+            (void)!write(c, "@RSYNCD: 31.0\n", 14);
+            while (write(c, "module\n", 7) == 7)
+                usleep(1000);
+        },
+        8732);
+    ASSERT_TRUE(drips.bound() && lists.bound());
+    struct Case {
+        std::string command;
+        std::string status;
+        std::string says;
+    };
+    const std::vector<Case> cases = {
+        {"rsync --port=8731 127.0.0.9::", "30\n", ""},
+        {"rsync --port=8732 127.0.0.9::", "30\n", "module"},
+        {"ssh -d cm9vdHB3 root@127.0.0.1 'while echo line; do sleep 0.1; done'", "255\n", "line"},
+        {"rsync -n -e 'sh -c \"setsid sleep 4711 & sleep 4711\"' x:y /tmp", "30\n", ""}};
+    int number = 0;
+    for (const Case &one : cases) {
+        const std::string file = "/tmp/" + std::to_string(++number);
+        shell("/usr/sbin/" + one.command + " >/tmp/unmarked 2>&1 </dev/null & echo $! >" + file + ".pid");
+        shell("{ " + (BOUND + ("timeout 20 /usr/sbin/" + one.command)) + " >" + file + " 2>&1; echo $? >" +
+              file + ".status; } >/dev/null 2>&1 &");
+    }
+    number = 0;
+    for (const Case &one : cases) {
+        const std::string file = "/tmp/" + std::to_string(++number);
+        EXPECT_TRUE(eventually([&] { return read_file(file + ".status") == one.status; })) << one.command;
+        EXPECT_TRUE(read_file(file).starts_with(one.says)) << one.command;
+        EXPECT_FALSE(has(read_file(file), "error")) << one.command;
+        EXPECT_EQ(shell("kill $(cat " + file + ".pid)").status, 0) << "nobody's probe: " << one.command;
+    }
+    end_waits();
+    EXPECT_TRUE(eventually([] { return left_processes().empty(); })) << left_processes();
+}
+
+TEST_F(Programs, TheBoundOfAProbeChangesNothingElse)
+{
+    const std::string ssh = BOUND + SSH + " -d cm9vdHB3 root@127.0.0.1 ";
+    EXPECT_EQ(shell(ssh + "'echo x; exit 7'").status, 7);
+    EXPECT_EQ(shell("echo in | " + ssh + "cat").output, "in\n");
+    EXPECT_EQ(shell(BOUND + RSYNC + " /no/such/file /tmp 2>/dev/null").status, 23);
+
+    // However it is ended, its caller hears the same, and its stock program goes with it.
+    const auto ended_by = [&](const std::string &who, const std::string &number) {
+        fs::remove("/tmp/ended");
+        shell("{ BAKJOB_RUN=1 /usr/sbin/rsync -n -e 'sh -c \"cat >/dev/null; :\"' x:y /tmp; "
+              "echo $? >/tmp/ended; } >/dev/null 2>&1 &");
+        EXPECT_TRUE(eventually([] { return shell("pgrep -x cat").status == 0; }));
+        shell("kill -" + number + " $(pgrep -" + who + " -f '^/usr/sbin/rsync .*x:y')");
+        EXPECT_TRUE(eventually([] { return exists("/tmp/ended") && left_processes().empty(); }))
+            << left_processes();
+        return read_file("/tmp/ended");
+    };
+    EXPECT_EQ(ended_by("n", "KILL"), "137\n") << "the stock program";
+    EXPECT_EQ(ended_by("o", "KILL"), "137\n") << "the appliance's";
+    EXPECT_EQ(ended_by("o", "TERM"), "20\n") << "passed on";
+
+    // Transfers take as long as they take.
+    write_file("/tmp/from/file", std::string(15'000, 'x'));
+    const std::string transfer =
+        BOUND + RSYNC + " --job-name=daily --bwlimit=10 -aq8 -e '/usr/sbin/ssh -d cm9vdHB3' /tmp/from/file ";
+    shell(transfer + "/tmp/here & " + transfer + "root@127.0.0.1:/tmp/there; wait");
+    EXPECT_EQ(fs::file_size("/tmp/here"), 15'000U);
+    EXPECT_EQ(fs::file_size("/tmp/there"), 15'000U);
 }
 
 } // namespace

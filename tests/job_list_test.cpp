@@ -109,10 +109,10 @@ TEST_F(JobList, TheStoreKeepsEveryFieldAndNumbersFromOne)
     EXPECT_EQ(job_key(3, "rlast_do_job_time"), "then");
     EXPECT_EQ(job_key(4, "job_name"), "(none)");
 
-    const std::string first = read_file("/etc/NAS_CFG/config.xml");
+    const std::string first = read_file(STORE);
     rsync_load_jobs();
     rsync_save_jobs();
-    EXPECT_EQ(read_file("/etc/NAS_CFG/config.xml"), first) << "a second save changes nothing";
+    EXPECT_EQ(read_file(STORE), first) << "a second save changes nothing";
 
     rsync_load_jobs();
     rsync_list_remove_job(rsync_find_job("two"));

@@ -1,9 +1,7 @@
 // What reaches people's terminals.
 
 #include "output/output.h"
-
-#include <gtest/gtest.h>
-#include <map>
+#include "support.h"
 
 using namespace bakjob::ctl;
 
@@ -52,4 +50,16 @@ TEST(Output, TextsFitByCharactersNotBytes)
     testing::internal::CaptureStdout();
     print_table({}, {{""}, {"", "x"}});
     EXPECT_EQ(testing::internal::GetCapturedStdout(), "\n  x\n");
+}
+
+// The trace of a hostile name is for whoever reads a file as it is, and harmless for whoever sits at a
+// terminal.
+TEST_F(Appliance, ATraceDoesNotActOnATerminal)
+{
+    write_file("/tmp/trace", "#!/bin/bash\n/usr/sbin/bakjob -d -r $'x\\e[2J\\xc2\\x9b1my'\n");
+    EXPECT_EQ(shell("bash /tmp/trace").output,
+              "OPEN DEBUG MODE!!\nERROR: not found this job_name [x\033[2J\xc2\x9b"
+              "1my] or disabled\n");
+    EXPECT_EQ(shell("script -qec 'bash /tmp/trace' /dev/null </dev/null").output,
+              "OPEN DEBUG MODE!!\r\nERROR: not found this job_name [x?[2J?1my] or disabled\r\n");
 }

@@ -10,18 +10,14 @@ using namespace bakjob;
 class Schedule : public Appliance
 {
 protected:
-    // The group "rsync" stands between two others; its entries run these commands.
+    // The group "rsync" stands between two others.
     static void set_entries(const std::vector<std::string> &commands)
     {
+        store_set("/system_mgr/crond/list/count", "1");
+        store_set("/system_mgr/crond/list/name:1", "first");
+        set_schedule(commands);
         store_set("/system_mgr/crond/list/count", "3");
-        for (const auto &[number, name] : Keys{{"1", "first"}, {"2", "rsync"}, {"3", "last"}}) {
-            store_set("/system_mgr/crond/list/name:" + number, name);
-        }
-        store_set("/system_mgr/crond/rsync/count", std::to_string(commands.size()));
-        int item = 0;
-        for (const std::string &command : commands) {
-            store_set("/system_mgr/crond/rsync/item:" + std::to_string(++item) + "/run", command);
-        }
+        store_set("/system_mgr/crond/list/name:3", "last");
         store_save();
     }
 
@@ -42,8 +38,8 @@ protected:
                store_get("/system_mgr/crond/list/name:3");
     }
 
-    // "/etc/cron.d/device_scheduler" is written exactly when the scheduler was told.
-    static bool committed() { return exists("/etc/cron.d/device_scheduler"); }
+    // The file is written exactly when the scheduler was told.
+    static bool committed() { return exists(CRON); }
 };
 
 TEST_F(Schedule, PruningKeepsExactlyTheEntriesThatNameAJob)
@@ -73,7 +69,12 @@ TEST_F(Schedule, PruningKeepsExactlyTheEntriesThatNameAJob)
          filler + "'a'|",
          all_groups,
          true},
-        {{"a"}, {filler + "'b'"}, "", no_group, true}};
+        {{"a"}, {filler + "'b'"}, "", no_group, true},
+        {{"a"},
+         {std::string(1U << 20U, '\''), "-r 'b'"},
+         std::string(4095, '\'') + "|",
+         all_groups,
+         true}}; // cannot be judged
     for (const Case &one : cases) {
         SetUp();
         set_entries(one.commands);
@@ -85,16 +86,6 @@ TEST_F(Schedule, PruningKeepsExactlyTheEntriesThatNameAJob)
         EXPECT_EQ(groups(), one.groups);
         EXPECT_EQ(committed(), one.committed) << one.left;
     }
-}
-
-TEST_F(Schedule, ACommandTooLongToBeJudgedStays)
-{
-    set_entries({std::string(1U << 20U, '\''), "-r 'b'"});
-    rsync_load_jobs();
-    rsync_list_add_job(make_job("a"));
-    rsync_save_jobs();
-    EXPECT_EQ(store_get("/system_mgr/crond/rsync/count"), "1");
-    EXPECT_EQ(store_get("/system_mgr/crond/rsync/item:1/run").substr(0, 3), "'''");
 }
 
 TEST_F(Schedule, RemovingAJobsEntryTakesTheFirstThatHoldsItsName)
@@ -122,20 +113,14 @@ TEST_F(Schedule, AnEntryIsCreatedForTheSchedulerAndTheGroupDeleted)
     rsync_create_schedule("5", "2", "*", "*", "1", "root", "/usr/sbin/bakjob -r '100%'");
     rsync_create_schedule("6", "2", "*", "*", "1", "root", "/usr/sbin/bakjob -r 'b'");
     EXPECT_EQ(entries(), "/usr/sbin/bakjob -r '100%'|/usr/sbin/bakjob -r 'b'|");
-    EXPECT_NE(read_file("/etc/cron.d/device_scheduler").find("5 2 * * 1 root /usr/sbin/bakjob -r '100\\%'\n"),
-              std::string::npos);
+    EXPECT_TRUE(has(read_file(CRON), "5 2 * * 1 root /usr/sbin/bakjob -r '100\\%'\n"));
     for (const char *list : {"/system_mgr/crond/rsync/count", "/system_mgr/crond/list/count"})
         store_set(list, "2147483647");
     EXPECT_EQ(LIB_do_ctc(), 0) << "ends with the entries that are there, whatever the count says";
-    EXPECT_EQ(lines_of(read_file("/etc/cron.d/device_scheduler")).size(), 2U);
-    EXPECT_LT(LIB_create_xml("7", "2", "*", "*", "1", "root", "x", "rsync"), 0);
-    for (const char *list : {"/system_mgr/crond/rsync/count", "/system_mgr/crond/list/count"}) {
-        store_set(list, "0");
-        EXPECT_LT(LIB_create_xml("7", "2", "*", "*", "1", "root", "x", "rsync"), 0) << "in an entry's place";
-        store_set(list, list == std::string("/system_mgr/crond/list/count") ? "1" : "2");
-    }
-    EXPECT_EQ(entries(), "/usr/sbin/bakjob -r '100%'|/usr/sbin/bakjob -r 'b'|");
+    EXPECT_EQ(lines_of(read_file(CRON)).size(), 2U);
+    store_set("/system_mgr/crond/rsync/count", "2");
+    store_set("/system_mgr/crond/list/count", "1");
     rsync_delete_schedule();
     EXPECT_EQ(entries(), "");
-    EXPECT_EQ(read_file("/etc/cron.d/device_scheduler").find("bakjob -r"), std::string::npos);
+    EXPECT_FALSE(has(read_file(CRON), "bakjob -r"));
 }

@@ -6,9 +6,11 @@
 
 #include <array>
 #include <chrono>
+#include <fcntl.h>
 #include <filesystem>
 #include <fstream>
 #include <sstream>
+#include <sys/mount.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <system_error>
@@ -56,13 +58,58 @@ Ran shell(const std::string &command)
     return {WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status), output};
 }
 
+pid_t start(const std::vector<std::string> &arguments)
+{
+    const pid_t child = fork();
+    if (child != 0) return child;
+    const int output = open("/tmp/output", O_WRONLY | O_CREAT | O_TRUNC, 0600);
+    dup2(output, STDOUT_FILENO);
+    dup2(output, STDERR_FILENO);
+    std::vector<char *> argv{const_cast<char *>("bakjob")};
+    for (const std::string &argument : arguments)
+        argv.push_back(const_cast<char *>(argument.c_str()));
+    argv.push_back(nullptr);
+    execv("/usr/sbin/bakjob", argv.data());
+    _exit(127);
+}
+
+int wait_for(pid_t child)
+{
+    int status = 0;
+    waitpid(child, &status, 0);
+    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+}
+
 int in_child(const std::function<int()> &body)
 {
     const pid_t child = fork();
     if (child == 0) _exit(body());
-    int status = 0;
-    waitpid(child, &status, 0);
-    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+    return wait_for(child);
+}
+
+void become_neighbour()
+{
+    if (setgid(65534) != 0 || setuid(65534) != 0) _exit(1);
+}
+
+std::string printed_by(const std::function<void()> &body)
+{
+    testing::internal::CaptureStdout();
+    body();
+    return testing::internal::GetCapturedStdout();
+}
+
+std::string complaints_of(const std::function<void()> &body)
+{
+    testing::internal::CaptureStderr();
+    body();
+    return testing::internal::GetCapturedStderr();
+}
+
+testing::AssertionResult has(const std::string &text, const std::string &part)
+{
+    if (text.find(part) != std::string::npos) return testing::AssertionSuccess();
+    return testing::AssertionFailure() << "not in it: " << part << "\n" << text;
 }
 
 bool eventually(const std::function<bool()> &condition, int seconds)
@@ -93,8 +140,17 @@ void Appliance::SetUp()
           " -xdev -mindepth 1 -delete 2>/dev/null; "
           "rm -rf /run/bakjob_*");
     fs::remove("/var/log/device_alerts");
-    fs::remove("/etc/cron.d/device_scheduler");
+    fs::remove(CRON);
     bakjob::run_options = {};
+}
+
+void ApplianceWithShare::SetUp()
+{
+    Appliance::SetUp();
+    add_share("Public", SHARE);
+    write_file(SHARE + "/file", "x");
+    write_file("/tmp/kv_serial.txt", "S1");
+    shell("rm -f ~root/.ssh/known_hosts");
 }
 
 void Appliance::TearDown()
@@ -126,7 +182,7 @@ std::string store_get(const std::string &path)
 
 void store_save()
 {
-    ASSERT_EQ(xml_write_file("/etc/NAS_CFG/config.xml"), 0);
+    ASSERT_EQ(xml_write_file(STORE.c_str()), 0);
 }
 
 int add_job(const Keys &keys)
@@ -181,6 +237,18 @@ void add_share(const std::string &name, const std::string &path)
     fs::create_directories(path);
 }
 
+void set_schedule(const std::vector<std::string> &commands)
+{
+    const std::string entries = "/system_mgr/crond/rsync/";
+    const int groups = std::max(0, xml_get_int("/system_mgr/crond/list/count")) + 1;
+    store_set("/system_mgr/crond/list/count", std::to_string(groups));
+    store_set("/system_mgr/crond/list/name:" + std::to_string(groups), "rsync");
+    store_set(entries + "count", std::to_string(commands.size()));
+    for (std::size_t i = 0; i < commands.size(); ++i)
+        store_set(entries + "item:" + std::to_string(i + 1) + "/run", commands[i]);
+    store_save();
+}
+
 bakjob::JobName named(const std::string &name)
 {
     return bakjob::JobName::checked(name).value();
@@ -206,14 +274,31 @@ bakjob::RsyncJob make_job(const std::string &name)
 
 Fake::Fake(std::string program, const std::string &script) : program_(std::move(program))
 {
-    fs::rename(program_, program_ + ".real");
+    if (exists(program_)) fs::rename(program_, program_ + ".real");
     write_file(program_, "#!/bin/sh\n" + script);
     fs::permissions(program_, fs::perms(0755));
 }
 
 Fake::~Fake()
 {
-    fs::rename(program_ + ".real", program_);
+    fs::remove(program_);
+    if (exists(program_ + ".real")) fs::rename(program_ + ".real", program_);
+}
+
+ReadOnly::ReadOnly(std::string folder) : folder_(std::move(folder))
+{
+    EXPECT_EQ(mount(folder_.c_str(), folder_.c_str(), "", MS_BIND, nullptr), 0) << folder_;
+    EXPECT_EQ(mount(nullptr, folder_.c_str(), "", MS_REMOUNT | MS_BIND | MS_RDONLY, nullptr), 0);
+}
+
+ReadOnly::~ReadOnly()
+{
+    umount2(folder_.c_str(), MNT_DETACH);
+}
+
+std::vector<std::string> alerts()
+{
+    return lines_of(read_file("/var/log/device_alerts"));
 }
 
 Ran bakjob_program(const std::string &arguments)
@@ -228,9 +313,4 @@ std::vector<std::string> lines_of(const std::string &text)
     for (std::string line; std::getline(stream, line);)
         lines.push_back(line);
     return lines;
-}
-
-std::vector<std::string> alerts()
-{
-    return lines_of(read_file("/var/log/device_alerts"));
 }
