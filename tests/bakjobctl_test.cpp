@@ -150,9 +150,8 @@ TEST_F(Ctl, SnapshotsAreNumberedAsARecoverRunTakesThem)
 {
     ASSERT_TRUE(says(add("weekly", "backup_type=pull inc_enable=yes"), 0, ""));
     EXPECT_TRUE(says(ctl("snapshots weekly"), 0, "There are none yet"));
-    for (const char *folder : {"weekly.1", "weekly.2", "weekly.old", "other.0"}) {
+    for (const char *folder : {"weekly.1", "weekly.2", "weekly.old", "other.0"})
         fs::create_directories(SHARE + "/" + folder);
-    }
     shell("touch --date='2026-01-02 03:04:05' /mnt/HD/HD_a2/Public/weekly.2");
     const Ran ran = ctl("snapshots weekly");
     EXPECT_EQ(lines_of(ran.output).size(), 3U) << ran.output;

@@ -67,9 +67,8 @@ bool is_lock(const std::string &path)
 std::vector<std::string> moved_aside()
 {
     std::vector<std::string> found;
-    for (const auto &entry : fs::directory_iterator("/tmp")) {
+    for (const auto &entry : fs::directory_iterator("/tmp"))
         if (entry.path().string().starts_with(LOCK + ".aside.")) found.push_back(entry.path());
-    }
     return found;
 }
 
@@ -138,9 +137,7 @@ void plant_socket()
     });
 }
 
-class ConfigLock : public Ctl
-{
-};
+using ConfigLock = Ctl;
 
 } // namespace
 
@@ -279,9 +276,8 @@ TEST_F(ConfigLock, WithoutOneARunGoesOnAndPeopleChangeNothing)
     const ReadOnly nothing_is_made("/tmp");
     const std::string why = LOCK + " cannot be locked: Read-only file system";
     for (const char *change : {"set daily retry=7", "disable daily", "schedule daily '0 3 * * *'",
-                               "add b remote_ip=a remote_path=b local_path=/mnt/HD/HD_a2/Public"}) {
+                               "add b remote_ip=a remote_path=b local_path=/mnt/HD/HD_a2/Public"})
         EXPECT_TRUE(says(ctl(change), 3, "bakjobctl: " + why + "; nothing is changed\n")) << change;
-    }
     EXPECT_EQ(read_file(STORE), before);
     EXPECT_FALSE(exists(CRON));
     EXPECT_TRUE(says(ctl("show daily"), 0, "daily"));

@@ -47,9 +47,8 @@ void elsewhere(const Keys &changes)
 std::vector<std::string> files_beside_store()
 {
     std::vector<std::string> names;
-    for (const auto &entry : fs::directory_iterator("/etc/NAS_CFG")) {
+    for (const auto &entry : fs::directory_iterator("/etc/NAS_CFG"))
         names.push_back(entry.path().filename());
-    }
     return names;
 }
 

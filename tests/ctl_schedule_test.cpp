@@ -4,10 +4,7 @@
 #include "config/schedule.h"
 #include "ctl_support.h"
 
-#include <array>
 #include <filesystem>
-#include <sys/inotify.h>
-#include <unistd.h>
 
 using namespace bakjob;
 namespace fs = std::filesystem;
@@ -23,48 +20,6 @@ protected:
     static Ran schedule() { return ctl("schedule daily '0 3 * * *'"); }
 };
 
-// How often a file of a folder was replaced while this lives.
-class Replacements
-{
-public:
-    explicit Replacements(const char *folder) : events_(inotify_init1(IN_NONBLOCK))
-    {
-        // Events that are the same as the one before are dropped, so every other one is of another kind.
-        inotify_add_watch(events_, folder, IN_MOVED_FROM | IN_MOVED_TO);
-    }
-    Replacements(const Replacements &) = delete;
-    Replacements &operator=(const Replacements &) = delete;
-    ~Replacements() { close(events_); }
-
-    [[nodiscard]] int count() const
-    {
-        alignas(inotify_event) std::array<char, 4096> events{};
-        const ssize_t length = read(events_, events.data(), events.size());
-        int count = 0;
-        for (ssize_t at = 0; at < length;) {
-            const auto *event = reinterpret_cast<const inotify_event *>(events.data() + at); // NOLINT
-            if ((event->mask & IN_MOVED_TO) != 0) ++count;
-            at += static_cast<ssize_t>(sizeof *event + event->len);
-        }
-        return count;
-    }
-
-private:
-    int events_;
-};
-
-TEST_F(CtlSchedule, ATimetableIsSavedOnceAndHandedOverOnce)
-{
-    const Replacements saves("/etc/NAS_CFG");
-    const Replacements hand_overs("/etc/cron.d");
-    EXPECT_TRUE(says(schedule(), 0, ""));
-    EXPECT_EQ(saves.count(), 1) << "whoever ends the command leaves all of it or nothing";
-    EXPECT_EQ(hand_overs.count(), 1);
-    EXPECT_EQ(read_file(CRON), OF_DAILY);
-    EXPECT_EQ(job_key(1, "schedule_mode"), "1");
-    EXPECT_EQ(read_file(FLASH), read_file(STORE));
-}
-
 TEST_F(CtlSchedule, AJobHasOneTimetableAndKeepsItToItself)
 {
     for (const char *name : {"\"it's 100%\"", "dailyy"}) {
@@ -78,6 +33,8 @@ TEST_F(CtlSchedule, AJobHasOneTimetableAndKeepsItToItself)
     EXPECT_EQ(read_file(CRON), of_others + "*/5 0-6/2,23 1 JAN,7 mon-5 root /usr/sbin/bakjob -r 'daily'\n");
     EXPECT_TRUE(says(ctl("show daily"), 0, "timetable             */5 0-6/2,23 1 JAN,7 mon-5"));
 
+    EXPECT_EQ(job_key(1, "schedule_mode"), "1");
+    EXPECT_EQ(read_file(FLASH), read_file(STORE));
     ASSERT_TRUE(says(ctl("unschedule daily"), 0, ""));
     ASSERT_TRUE(says(ctl("set daily schedule_mode=once"), 0, ""));
     EXPECT_EQ(read_file(CRON), of_others);

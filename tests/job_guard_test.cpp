@@ -17,17 +17,9 @@
 using namespace bakjob;
 namespace fs = std::filesystem;
 
-class Guard : public Appliance
-{
-};
-
-class State : public Appliance
-{
-};
-
-class RecoverListing : public Appliance
-{
-};
+using Guard = Appliance;
+using State = Appliance;
+using RecoverListing = Appliance;
 
 namespace
 {

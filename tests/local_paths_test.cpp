@@ -8,36 +8,26 @@
 using namespace bakjob;
 namespace fs = std::filesystem;
 
-class LocalPaths : public Appliance
-{
-};
+using LocalPaths = Appliance;
 
 TEST_F(LocalPaths, VolumesAreFoundByTheirSharedNames)
 {
     const std::string long_word(64, 'w');
     write_file("/etc/shared_name",
                "Volume_1 = HD_a2 /x\nVolume_2 = HD_b2 HD_a2\n" + long_word + " = HD_c2\n");
-    const Keys paths = {{"/mnt/HD/HD_a2/Public/x", "/Volume_1/Public/x"},
-                        {"/mnt/HD/HD_b2/P", "/Volume_2/P"},
-                        {"/mnt/HD/HD_a2", "/Volume_1/"},
-                        {"/mnt/HD/HD_a2/", "/Volume_1/"},
-                        {"/mnt/HD_a2/Public", ""},
-                        {"/mnt/HD/HD_d2/P", ""},
-                        {"/mnt/HD/HD_c2/P", ""},
-                        {"/mnt/HD/", ""},
-                        {"/mnt/HD/HD", ""},
-                        {"/mnt/HD/HD_a2/" + std::string(1020, 'x'), ""}};
-    for (const auto &[path, shared] : paths)
+    for (const auto &[path, shared] : Keys{{"/mnt/HD/HD_a2/Public/x", "/Volume_1/Public/x"},
+                                           {"/mnt/HD/HD_b2/P", "/Volume_2/P"},
+                                           {"/mnt/HD/HD_a2", "/Volume_1/"},
+                                           {"/mnt/HD/HD_a2/", "/Volume_1/"}})
         EXPECT_EQ(rsync_shared_path(path), shared) << path;
-    const std::map<std::string, int> volumes = {{"/mnt/HD/HD_a2/Public", 1},
-                                                {"/mnt/HD/HD_a2", 1},
-                                                {"/mnt/HD/HD_x2/P", 0},
-                                                {"/mnt/HD", 0},
-                                                {"/mnt/HD/", 0},
-                                                {"/x/y/HD_b2", 1},
-                                                {"", 0}};
-    for (const auto &[path, is_shared] : volumes)
-        EXPECT_EQ(rsync_volume_is_shared(path), is_shared) << path;
+    for (const std::string path :
+         {"/mnt/HD_a2/Public", "/mnt/HD/HD_d2/P", "/mnt/HD/HD_c2/P", "/mnt/HD/", "/mnt/HD/HD"})
+        EXPECT_STREQ(rsync_shared_path(path), "") << path;
+    EXPECT_STREQ(rsync_shared_path("/mnt/HD/HD_a2/" + std::string(1020, 'x')), "");
+    for (const char *path : {"/mnt/HD/HD_a2/Public", "/mnt/HD/HD_a2", "/x/y/HD_b2"})
+        EXPECT_EQ(rsync_volume_is_shared(path), 1) << path;
+    for (const char *path : {"/mnt/HD/HD_x2/P", "/mnt/HD", "/mnt/HD/", ""})
+        EXPECT_EQ(rsync_volume_is_shared(path), 0) << path;
     fs::remove("/etc/shared_name");
     EXPECT_STREQ(rsync_shared_path("/mnt/HD/HD_a2/x"), "");
     EXPECT_EQ(rsync_volume_is_shared("/mnt/HD/HD_a2/x"), 0);

@@ -37,9 +37,8 @@ TEST_F(Operations, EachIsAWholeCycleThatLeavesNoList)
     const std::string before = read_file(STORE);
     RsyncJob untouched = make_job("mine");
     for (const int result : {rsync_enable_job("x"), rsync_disable_job("x"), rsync_delete_job("x"),
-                             rsync_get_job(untouched, "x"), rsync_modify_job(make_job("y"), "x")}) {
+                             rsync_get_job(untouched, "x"), rsync_modify_job(make_job("y"), "x")})
         EXPECT_EQ(result, 0);
-    }
     EXPECT_STREQ(untouched.job_name, "mine");
     EXPECT_EQ(read_file(STORE), before);
     EXPECT_EQ(rsync_get_job(untouched, "c"), 1);

@@ -11,7 +11,6 @@
 #include <csignal>
 #include <filesystem>
 #include <optional>
-#include <sys/resource.h>
 #include <unistd.h>
 
 using namespace bakjob;
@@ -33,13 +32,8 @@ private:
     std::optional<JobToHoldUp> job_;
 };
 
-class Killed : public Processes
-{
-};
-
-class Interrupt : public Processes
-{
-};
+using Killed = Processes;
+using Interrupt = Processes;
 
 constexpr const char *LOCK = "/tmp/rsync_write_conf.lock";
 
@@ -50,19 +44,6 @@ bool waits_for_lock(pid_t process)
 }
 
 } // namespace
-
-TEST_F(Killed, ADeadRunsCommandsAreFoundByTheirMark)
-{
-    const Fake program(RSYNC, phases()[0].script);
-    const pid_t run = start_until_there({"-r", "daily"});
-    kill(run, SIGKILL);
-    wait_for(run);
-    EXPECT_NE(left_processes(), "");
-    EXPECT_TRUE(exists(PID_FILE));
-    wait_for(start({"-k", "daily"}));
-    EXPECT_EQ(left_processes(), "");
-    EXPECT_FALSE(exists(PID_FILE));
-}
 
 // The pid file names a process that does not run the job; what that one has started is nobody's business
 // here, and what a neighbour says about his own processes neither.
@@ -88,6 +69,12 @@ TEST_F(Killed, StrangersAreSpared)
     wait_for(start({"-k", "daily"}));
     EXPECT_EQ(shell("pgrep -u 65534 -fxc 'sleep 4711'").output, "1\n");
     EXPECT_EQ(sleeping(), 1U);
+
+    for (const char *const left : {"junk", "", "4194304\n"}) {
+        write_file(PID_FILE, left);
+        wait_for(start({"-k", "daily"}));
+        EXPECT_FALSE(exists(PID_FILE)) << left;
+    }
 }
 
 TEST_F(Killed, ARunThatStartsMeanwhileKeepsItsPidFile)
@@ -111,22 +98,6 @@ TEST_F(Killed, ARunThatStartsMeanwhileKeepsItsPidFile)
         EXPECT_EQ(wait_for(run), 0);
         EXPECT_EQ(job_key(1, "state"), "2");
         EXPECT_FALSE(exists(PID_FILE));
-    }
-}
-
-TEST_F(Killed, ARunRemovesOnlyItsOwnPidFile)
-{
-    const Fake rsync(RSYNC, UNTIL_GO);
-    const pid_t run = start_until_there({"-r", "daily"});
-    fs::remove(PID_FILE);
-    write_file(PID_FILE, "1\n");
-    write_file("/tmp/go", "");
-    EXPECT_EQ(wait_for(run), 0);
-    EXPECT_EQ(read_file(PID_FILE), "1\n");
-    for (const char *const left : {"junk", "", "4194304\n"}) {
-        write_file(PID_FILE, left);
-        wait_for(start({"-k", "daily"}));
-        EXPECT_FALSE(exists(PID_FILE)) << left;
     }
 }
 
@@ -203,19 +174,4 @@ TEST_F(Interrupt, ALockThatIsHeldDoesNotKeepTheRun)
     const auto kept = rsync_unrecorded_state(named("daily"), StateKind::BACKUP);
     ASSERT_TRUE(kept);
     EXPECT_EQ(kept->state, JOB_INTERRUPTED);
-}
-
-TEST_F(Interrupt, AFileSizeLimitIsAFailedWrite)
-{
-    const pid_t run = fork();
-    if (run == 0) {
-        const rlimit limit{.rlim_cur = 100, .rlim_max = 100};
-        setrlimit(RLIMIT_FSIZE, &limit);
-        execl("/bin/sh", "sh", "-c", "exec /usr/sbin/bakjob -k daily 2>/tmp/output", nullptr);
-    }
-    EXPECT_EQ(wait_for(run), 0);
-    EXPECT_TRUE(has(read_file("/tmp/output"), "config store: cannot write"));
-    std::signal(SIGXFSZ, SIG_IGN);
-    EXPECT_EQ(first_line("ulimit -f 0; sh -c 'echo x >/tmp/x' || echo $?"), "153") << "not of commands";
-    std::signal(SIGXFSZ, SIG_DFL);
 }

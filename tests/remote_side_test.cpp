@@ -29,13 +29,9 @@ protected:
 TEST_F(RemoteSide, PushAndPullOverEveryAddressAndTransport)
 {
     const Keys daemon{{"ssh_pwd", SSH_PASSWORD}};
-    const Keys same_kind{
-        {"server_type", "1"}, {"rsync_user", "root"}, {"rsync_pwd", "pakto"}, {"ssh_pwd", SSH_PASSWORD}};
-    const Keys ssh{{"rsync_mode", "1"},
-                   {"use_ssh", "1"},
-                   {"ssh_pwd", "rootpw"},
-                   {"remote_path", "/remote/data/ssh"},
-                   {"rsync_user", "root"}};
+    const Keys same_kind = keys_of("server_type=1 rsync_user=root rsync_pwd=pakto ssh_pwd=cm9vdHB3");
+    const Keys ssh =
+        keys_of("rsync_mode=1 use_ssh=1 ssh_pwd=rootpw remote_path=/remote/data/ssh rsync_user=root");
     const std::string link_local = lines_of(read_file("/run/remote_link_local")).at(0);
     const std::string name = "/My Photos (1)";
     const std::string file = name + "/it's $x #1/f";

@@ -149,61 +149,30 @@ TEST_F(Run, ProbesDecideWhetherATransferStarts)
 
 TEST_F(Run, RefusedJobsRunNoTransfer)
 {
+    struct Case {
+        std::function<void(RsyncJob &)> change;
+        BackupResult result;
+        std::string calls;
+    };
+    const std::string no_file = "/no/such/folder/file";
+    const Fake ssh(SSH, "echo 'Permission denied'\n");
     add_job({});
+    for (const Case &one : std::vector<Case>{
+             {[](RsyncJob &job) { job.server_type = 3; }, BACKUP_FAILED, ""},
+             {[](RsyncJob &job) { copy_text(job.remote_ip, "1;reboot"); }, BACKUP_REMOTE_FAILED, ""},
+             {[](RsyncJob &job) { copy_text(job.remote_path, "m/\"x"); }, BACKUP_FAILED, "list "},
+             {[&](RsyncJob &job) { copy_text(job.rsync_pwd_file, no_file); }, BACKUP_FAILED, ""},
+             {[](RsyncJob &job) { job.use_ssh = 1; }, BACKUP_SSH_FAILED, ""}}) {
+        RsyncJob job = make_job("daily");
+        one.change(job);
+        EXPECT_EQ(back_up(job), one.result);
+        expect_calls(one.calls);
+    }
+    EXPECT_EQ(job_key(1, "state"), "0");
     RsyncJob job = make_job("daily");
-    job.server_type = 3;
-    EXPECT_EQ(back_up(job), BACKUP_FAILED);
-    expect_calls("");
-    job = make_job("daily");
-    copy_text(job.remote_ip, "1;reboot");
-    EXPECT_EQ(back_up(job), BACKUP_REMOTE_FAILED);
-    expect_calls("");
-    job = make_job("daily");
-    copy_text(job.remote_path, "m/\"x");
-    EXPECT_EQ(back_up(job), BACKUP_FAILED);
-    expect_calls("list ");
-    job = make_job("daily");
-    copy_text(job.rsync_pwd_file, "/no/such/folder/file");
-    EXPECT_EQ(back_up(job), BACKUP_FAILED);
+    copy_text(job.rsync_pwd_file, no_file);
     job.rsync_mode = 1;
     EXPECT_EQ(back_up(job), BACKUP_DONE) << "a remote shell needs no password file";
-    job = make_job("daily");
-    job.use_ssh = 1;
-    const Fake ssh(SSH, "echo 'Permission denied'\n");
-    EXPECT_EQ(back_up(job), BACKUP_SSH_FAILED);
-    expect_calls("");
-    EXPECT_EQ(job_key(1, "state"), "3") << "of the one transfer above";
-}
-
-TEST_F(Run, ThePasswordFileHoldsWhatTheServerTakes)
-{
-    struct Case {
-        int pwd_encoded;
-        int server_type;
-        std::string password;
-        std::string content; // none: refused
-    };
-    const std::string longest(127, 'p');
-    const std::string path = "/tmp/r_it's $x.passwd";
-    write_file("/tmp/victim", "kept");
-    for (const Case &one : std::vector<Case>{{0, 2, "secret", "secret\n"},
-                                             {0, 1, "secret", "c2VjcmV0\n"},
-                                             {1, 2, "c2VjcmV0", "secret\n"},
-                                             {1, 1, "c2VjcmV0", "c2VjcmV0\n"},
-                                             {0, 2, longest, longest + "\n"},
-                                             {0, 1, longest.substr(33), ""},
-                                             {1, 2, "!", ""}}) {
-        CurrentJob = make_job("it's $x");
-        CurrentJob.pwd_encoded = one.pwd_encoded;
-        CurrentJob.server_type = one.server_type;
-        copy_text(CurrentJob.rsync_pwd, one.password);
-        fs::remove(path);
-        fs::create_symlink("/tmp/victim", path);
-        EXPECT_EQ(rsync_write_password_file(), !one.content.empty());
-        if (one.content.empty()) continue;
-        EXPECT_EQ(read_file(path) + octal_mode(path), one.content + "600");
-    }
-    EXPECT_EQ(read_file("/tmp/victim"), "kept");
 }
 
 TEST_F(Run, EachFolderRaisesItsAlertAndTheJobItsState)
@@ -272,25 +241,22 @@ TEST_F(Run, RefusalsChangeNothing)
         int status;
         std::string trace;
     };
-    const std::vector<Case> cases = {
-        {{}, "-d -r other", 255, "ERROR: not found this job_name [other] or disabled\n"},
+    std::vector<Case> cases = {
         {{{"enable", "0"}}, "-d -r daily", 255, "ERROR: not found this job_name [daily] or disabled\n"},
-        {{}, "-d -r ../daily", 255, "ERROR: not found this job_name [../daily] or disabled\n"},
-        {{}, "-d -r ''", 255, "ERROR: not found this job_name [] or disabled\n"},
         {{{"job_name", "a/b"}}, "-d -r a/b", 255, "ERROR: not found this job_name [a/b] or disabled\n"},
         {{{"schedule_mode", "2"}, {"state", "2"}}, "-d -r daily", 255, ""},
         {{{"schedule_mode", "2"}, {"state", "2"}}, "-d -r daily -b", 255, ""},
         {{}, "-d -n 1 -r daily", 255, ""},
         {{{"inc_enable", "1"}, {"backup_type", "2"}}, "-d -n 1 -r daily", 255, ""},
-        {{}, "-d -n 0 -r daily", 255, "ERROR: input error!\n"},
-        {{}, "-d -n 11", 255, "ERROR: input error!\n"},
-        {{}, "-d -n abc", 255, "ERROR: input error!\n"},
-        {{}, "-d -n 4294967297", 255, "ERROR: input error!\n"},
-        {{}, "-d -n -4294967295", 255, "ERROR: input error!\n"},
         {{}, "-d -k a/b", 0, "ERROR: job name refused: [a/b]\n"},
         {{}, "-d -n 10 -n -3", 0, ""},
         {{}, "-d -p cGFrdG8= -p YWJj", 0, "encode_pwd = [pakto]\nencode_pwd = [abcto]\n"},
     };
+    for (const std::string name : {"other", "../daily", ""})
+        cases.push_back(
+            {{}, "-d -r '" + name + "'", 255, "ERROR: not found this job_name [" + name + "] or disabled\n"});
+    for (const std::string number : {"0 -r daily", "11", "abc", "4294967297", "-4294967295"})
+        cases.push_back({{}, "-d -n " + number, 255, "ERROR: input error!\n"});
     for (const Case &one : cases) {
         SetUp();
         add_job(one.keys);

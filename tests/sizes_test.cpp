@@ -54,18 +54,16 @@ TEST_F(Sizes, WordsOfRepliesAreJudged)
                                          {"a b c", "N/A"},
                                          {std::string(200, 'x') + " 1 2 3G 4", "3G"},
                                          {"a b c " + long_word, long_word},
-                                         {"a b c " + long_word + "7", "N/A"}}) {
+                                         {"a b c " + long_word + "7", "N/A"}})
         EXPECT_EQ(judged(size_of_df_line, line), size) << line;
-    }
     for (const auto &[line, size] : Keys{{"4.0K\t/x", "4.0K"},
                                          {"0\t/x", "0"},
                                          {"12k", "12k"},
                                          {"3.5T\t/x", "N/A"},
                                          {"42\t/x", "N/A"},
                                          {"du: cannot access", "N/A"},
-                                         {std::string(40, '1') + "K", "N/A"}}) {
+                                         {std::string(40, '1') + "K", "N/A"}})
         EXPECT_EQ(judged(size_of_du_reply, line), size) << line;
-    }
     EXPECT_EQ(judged(size_of_du_reply, "", "7G"), "7G") << "an earlier text is left to be judged";
     EXPECT_EQ(judged(size_of_du_reply, " ", ""), "N/A");
 }
@@ -117,9 +115,8 @@ TEST_F(Sizes, RemoteCommandsAreExact)
 TEST_F(Sizes, HostileFoldersAreNeverSent)
 {
     for (const char *folder : {"/a b", "/a;reboot", "/$(reboot)", "/`reboot`", "/a'b", "/a&b", "/a|b", "/a>b",
-                               "/a\nb", "/a\"b", "/*", "-x", "/a\\b"}) {
+                               "/a\nb", "/a\"b", "/*", "-x", "/a\\b"})
         EXPECT_EQ(remote_du(folder), "N/A") << folder;
-    }
     copy_text(CurrentJob.ssh_user, "a b");
     EXPECT_EQ(remote_du("/m", "7G"), "N/A") << "a refused login is no earlier text";
     copy_text(CurrentJob.ssh_user, "me");

@@ -81,7 +81,7 @@ TEST_F(SnapshotMark, GoesWithTheSnapshotAndNotWithATransferThatFailed)
     EXPECT_TRUE(says(ctl("check weekly"), 0, "not known to be complete: weekly.2, weekly.3\n"));
 }
 
-TEST_F(SnapshotMark, IsNotLeftByAStepThatFailed)
+TEST_F(SnapshotMark, IsNotLeftByAStepThatFailedOrDiedWithItsRun)
 {
     struct Case {
         std::string program;
@@ -90,6 +90,7 @@ TEST_F(SnapshotMark, IsNotLeftByAStepThatFailed)
         std::string trace;
     };
     const std::string moving = "case $1 in *weekly.1) ";
+    const std::string die = "kill -9 $(cat /var/run/bakjob_weekly.pid); exit\n";
     const std::vector<Case> cases = {
         {"cp", "/bin/cp \"$@\"; rm $3/sub/b; exit 1\n", "0w 1 2w 3w", "[cp -al "},
         {"cp", "/bin/cp \"$@\"; rm $3/sub/b; kill -9 $$\n", "0w 1 2w 3w", "exit code 137"},
@@ -98,34 +99,21 @@ TEST_F(SnapshotMark, IsNotLeftByAStepThatFailed)
         {"mv", moving + "mkdir $2 ;; esac\n", "0w 1w 2 3w", ""},
         {"rm", "exit 1\n", "0w 1w 2w 3", "[rm -rf "},
         {"rm", "exit 0\n", "0w 1w 2w 3", "its target was there"},
-    };
+        {"rm", "/bin/rm -r $2/sub; " + die, "0w 1w 2w 3", ""},
+        {"mv", "cp -a $1 $2; /bin/rm -r $1/sub; " + die, "0w 1w 2 3", ""}, // between file systems
+        {"cp", "/bin/cp \"$@\"; rm $3/sub/b; " + die, "0w 1 2w 3w", ""}};
     for (const Case &c : cases) {
         SetUp();
         make_row();
         const Fake broken("/usr/local/bin/" + c.program, c.script + "exec /bin/" + c.program + " \"$@\"\n");
         const Ran ran = run();
         EXPECT_EQ(row(), c.row) << c.program << c.script << ran.output;
+        const bool copied = lgetxattr(snapshot(1).c_str(), SNAPSHOT_MARK, nullptr, 0) >= 0;
+        EXPECT_FALSE(c.program == "cp" && copied) << "nor that of the source";
+        if (c.script.ends_with(die)) continue;
         EXPECT_TRUE(has(ran.output, "ERROR: snapshots: "));
         EXPECT_TRUE(has(ran.output, c.trace));
         EXPECT_EQ(job_key(1, "state"), "2") << "the newest is whole";
-        const bool copied = lgetxattr(snapshot(1).c_str(), SNAPSHOT_MARK, nullptr, 0) >= 0;
-        EXPECT_FALSE(c.program == "cp" && copied) << "nor that of the source";
-    }
-}
-
-TEST_F(SnapshotMark, IsNotLeftWhenTheRunDiesWithItsCommand)
-{
-    const std::string die = "kill -9 $(cat /var/run/bakjob_weekly.pid); exit\n";
-    const std::map<std::string, std::pair<std::string, std::string>> cases = {
-        {"rm", {"/bin/rm -r $2/sub; ", "0w 1w 2w 3"}},
-        {"mv", {"cp -a $1 $2; /bin/rm -r $1/sub; ", "0w 1w 2 3"}}, // between file systems
-        {"cp", {"/bin/cp \"$@\"; rm $3/sub/b; ", "0w 1 2w 3w"}}};
-    for (const auto &[program, script] : cases) {
-        SetUp();
-        make_row();
-        const Fake deadly("/usr/local/bin/" + program, script.first + die);
-        run();
-        EXPECT_EQ(row(), script.second) << program;
     }
 }
 

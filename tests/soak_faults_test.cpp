@@ -50,9 +50,8 @@ protected:
     void SetUp() override
     {
         Holds::SetUp();
-        for (const char *name : {"one", "two", "three"}) {
+        for (const char *name : {"one", "two", "three"})
             add_job({{"job_name", name}, {"state", std::string(name) == "one" ? "0" : "3"}});
-        }
         ASSERT_EQ(ctl("schedule two '1 2 * * *'").status, 0);
         remember();
     }
@@ -95,10 +94,9 @@ protected:
     [[nodiscard]] std::string wrong(const Command &command, const Ran &ran) const
     {
         const auto now = contents();
-        for (std::size_t i = 0; i < now.size(); ++i) {
+        for (std::size_t i = 0; i < now.size(); ++i)
             if (now[i] != before_[i] && now[i] != after_[i])
                 return std::vector{"store", "flash", "cron"}[i] + std::string(" is neither old nor new");
-        }
         if (now[0] == before_[0] && now[1] != before_[1]) return "flash is ahead of the store";
         if (command.by_status && ran.status == 0 && now != after_) return "success was told";
         const bool done = read_file(STORE).find("<state>2</state>") != std::string::npos;
@@ -184,9 +182,8 @@ TEST_F(HoldsThroughFaults, MemoryThatEnds)
 // The limit is swept over all sizes at which a command ends somewhere between its start and its end.
 TEST_F(HoldsThroughFaults, AddressSpaceThatEnds)
 {
-    for (int i = 0; i < 300; ++i) {
+    for (int i = 0; i < 300; ++i)
         add_job({{"job_name", "many" + std::to_string(i)}});
-    }
     remember();
     const Command &add = COMMANDS[0];
     learn(add);

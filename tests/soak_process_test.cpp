@@ -172,7 +172,7 @@ TEST_F(Holds, NoTwoTransfersOverlapHoweverRunsAndKillsMeet)
     wait_for(others);
     const int transfers = static_cast<int>(lines_of(read_file("/tmp/transfer")).size());
     const int overlaps = static_cast<int>(lines_of(read_file("/tmp/overlaps")).size());
-    EXPECT_GT(transfers, tries / 2);
+    EXPECT_GT(transfers, tries / 5);
     EXPECT_EQ(overlaps, 0);
     expect_none_of(transfers, failures + overlaps, "runs and kills at once: no two transfers overlap");
 }

@@ -43,12 +43,8 @@ struct KindOfRun {
     Keys keys;
 };
 
-const Keys SNAPSHOTS = {{"backup_type", "2"}, {"inc_enable", "1"}};
-const Keys BY_SSH = {{"use_ssh", "1"},
-                     {"rsync_mode", "1"},
-                     {"ssh_pwd", "rootpw"},
-                     {"remote_path", "/remote/data"},
-                     {"rsync_user", "root"}};
+const Keys SNAPSHOTS = keys_of("backup_type=2 inc_enable=1");
+const Keys BY_SSH = keys_of("use_ssh=1 rsync_mode=1 ssh_pwd=rootpw remote_path=/remote/data rsync_user=root");
 const std::vector<KindOfRun> KINDS = {{"push", {}, {}},
                                       {"fetch", {}, SNAPSHOTS},
                                       {"ssh", {}, BY_SSH},

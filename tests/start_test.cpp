@@ -13,9 +13,7 @@
 namespace
 {
 
-class Start : public CtlDaily
-{
-};
+using Start = CtlDaily;
 
 constexpr const char *LOCK = "/tmp/rsync_write_conf.lock";
 

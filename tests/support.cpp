@@ -1,6 +1,7 @@
 #include "support.h"
 
 #include "common/run_options.h"
+#include "common/text.h"
 #include "config/job_list.h"
 #include "platform/config_store.h"
 
@@ -51,9 +52,8 @@ Ran shell(const std::string &command)
     std::string output;
     FILE *const pipe = popen(command.c_str(), "r"); // NOLINT(cert-env33-c)
     std::array<char, 4096> buffer{};
-    for (std::size_t n = 0; (n = fread(buffer.data(), 1, buffer.size(), pipe)) > 0;) {
+    for (std::size_t n = 0; (n = fread(buffer.data(), 1, buffer.size(), pipe)) > 0;)
         output.append(buffer.data(), n);
-    }
     const int status = pclose(pipe);
     return {WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status), output};
 }
@@ -125,9 +125,8 @@ bool eventually(const std::function<bool()> &condition, int seconds)
 bool has_open(pid_t process, const std::string &path)
 {
     std::error_code none;
-    for (const auto &handle : fs::directory_iterator("/proc/" + std::to_string(process) + "/fd", none)) {
+    for (const auto &handle : fs::directory_iterator("/proc/" + std::to_string(process) + "/fd", none))
         if (fs::equivalent(handle.path(), path, none)) return true;
-    }
     return false;
 }
 
@@ -185,39 +184,28 @@ void store_save()
     ASSERT_EQ(xml_write_file(STORE.c_str()), 0);
 }
 
+Keys keys_of(const std::string &words)
+{
+    Keys keys;
+    std::istringstream stream(words);
+    for (std::string word; stream >> word;)
+        keys[word.substr(0, word.find('='))] = word.substr(word.find('=') + 1);
+    return keys;
+}
+
 int add_job(const Keys &keys)
 {
-    Keys all{{"enable", "1"},
-             {"state", "0"},
-             {"pwd_encoded", "0"},
-             {"server_type", "2"},
-             {"backup_type", "1"},
-             {"rsync_mode", "2"},
-             {"schedule_mode", "1"},
-             {"use_ssh", "0"},
-             {"keep_exist_file", "0"},
-             {"inc_enable", "0"},
-             {"inc_number", "3"},
-             {"retry", "0"},
-             {"retry_interval", "1"},
-             {"rsync_timeout", "30"},
-             {"job_name", "daily"},
-             {"rsync_user", "bk"},
-             {"rsync_pwd", "secret"},
-             {"ssh_user", "root"},
-             {"ssh_pwd", ""},
-             {"port", "873"},
-             {"remote_ip", "127.0.0.1"},
-             {"remote_path", "backup"},
-             {"local_path", "/mnt/HD/HD_a2/Public"},
-             {"rstate", "0"}};
+    Keys all = keys_of("enable=1 state=0 rstate=0 pwd_encoded=0 server_type=2 backup_type=1 rsync_mode=2 "
+                       "schedule_mode=1 use_ssh=0 keep_exist_file=0 inc_enable=0 inc_number=3 retry=0 "
+                       "retry_interval=1 rsync_timeout=30 job_name=daily rsync_user=bk rsync_pwd=secret "
+                       "ssh_user=root ssh_pwd= port=873 remote_ip=127.0.0.1 remote_path=backup local_path=" +
+                       SHARE);
     for (const auto &[key, value] : keys)
         all[key] = value;
     const int item = std::max(0, xml_get_int("/backup_mgr/rsync/count")) + 1;
     store_set("/backup_mgr/rsync/count", std::to_string(item));
-    for (const auto &[key, value] : all) {
+    for (const auto &[key, value] : all)
         store_set("/backup_mgr/rsync/item:" + std::to_string(item) + "/" + key, value);
-    }
     store_save();
     return item;
 }
@@ -257,18 +245,15 @@ bakjob::JobName named(const std::string &name)
 bakjob::RsyncJob make_job(const std::string &name)
 {
     bakjob::RsyncJob job{};
-    job.enable = job.pwd_encoded = 1;
+    job.enable = job.pwd_encoded = job.backup_type = 1;
     job.server_type = job.rsync_mode = 2;
-    job.backup_type = 1;
     job.rsync_timeout = 600;
-    snprintf(job.job_name, sizeof job.job_name, "%s", name.c_str());
-    snprintf(job.rsync_user, sizeof job.rsync_user, "bk");
-    snprintf(job.rsync_pwd, sizeof job.rsync_pwd, "c2VjcmV0");
-    snprintf(job.port, sizeof job.port, "873");
-    snprintf(job.remote_ip, sizeof job.remote_ip, "192.168.1.20");
-    snprintf(job.remote_path, sizeof job.remote_path, "backup/share1");
-    snprintf(job.local_path, sizeof job.local_path, "/srv/share1");
-    snprintf(job.rsync_pwd_file, sizeof job.rsync_pwd_file, "/tmp/r_%s.passwd", name.c_str());
+    EXPECT_TRUE(bakjob::copy_text(job.job_name, name) && bakjob::copy_text(job.rsync_user, "bk") &&
+                bakjob::copy_text(job.rsync_pwd, "c2VjcmV0") && bakjob::copy_text(job.port, "873") &&
+                bakjob::copy_text(job.remote_ip, "192.168.1.20") &&
+                bakjob::copy_text(job.remote_path, "backup/share1") &&
+                bakjob::copy_text(job.local_path, "/srv/share1") &&
+                bakjob::copy_text(job.rsync_pwd_file, "/tmp/r_" + name + ".passwd"));
     return job;
 }
 

@@ -84,6 +84,9 @@ void store_set(const std::string &path, const std::string &text);
 std::string store_get(const std::string &path);
 void store_save();
 
+// Of words such as "retry=0 rsync_user=bk".
+Keys keys_of(const std::string &words);
+
 // Adds a job "daily" with plausible values, changed by `keys`, and saves. Its item number.
 int add_job(const Keys &keys);
 std::string job_key(int item, const std::string &key);

@@ -36,9 +36,8 @@ protected:
         const std::string before = both();
         for (const std::string change : {"set one retry=1", "delete one", "disable two",
                                          "add four remote_ip=127.0.0.1 remote_path=backup "
-                                         "local_path=/mnt/HD/HD_a2/Public"}) {
+                                         "local_path=/mnt/HD/HD_a2/Public"})
             EXPECT_TRUE(says(ctl(change), 3, reason)) << change;
-        }
         EXPECT_TRUE(says(ctl("list"), 3, reason));
         EXPECT_TRUE(says(ctl("check one"), 3, reason));
         bakjob_program("-r one");
@@ -124,10 +123,9 @@ TEST_F(WholeList, AMissingFileIsNotAnEmptyOneWhileFlashHasItsCopy)
 TEST_F(WholeList, WhatBringsTheProgramDownIsRefused)
 {
     std::string deep = "<config>";
-    for (const char *step : {"<a>", "</a>"}) {
+    for (const char *step : {"<a>", "</a>"})
         for (int i = 0; i < 100'000; ++i)
             deep += step;
-    }
     write_file(STORE, deep + good_.substr(good_.find("<config>") + 8));
     expect_refused("its elements are nested too deep");
     write_file(STORE, "<!DOCTYPE config [<!ENTITY nas \"NAS\">]>" + good_.substr(good_.find("<config>")));
