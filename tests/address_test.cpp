@@ -5,20 +5,15 @@ using namespace bakjob;
 
 TEST(Address, KindsDecideHowAHostIsWritten)
 {
-    for (const char *name : {"10.0.0.1", "nas.example", "nas", "::ffff:10.1.1.1", ""}) {
+    for (const char *name : {"10.0.0.1", "nas.example", "nas", "::ffff:10.1.1.1", ""})
         EXPECT_EQ(ip_address_kind(name), ADDRESS_IPV4) << name;
-    }
-    for (const char *name : {"fe80::1", "FE80::1", "febf::1", "feA0::1"}) {
+    for (const char *name : {"fe80::1", "FE80::1", "febf::1", "feA0::1"})
         EXPECT_EQ(ip_address_kind(name), ADDRESS_LINK_LOCAL) << name;
-    }
-    for (const char *name : {"fec0::1", "2001:db8::1", "::1", "f:"}) {
+    for (const char *name : {"fec0::1", "2001:db8::1", "::1", "f:"})
         EXPECT_EQ(ip_address_kind(name), ADDRESS_IPV6) << name;
-    }
 }
 
-class LinkLocal : public Appliance
-{
-};
+using LinkLocal = Appliance;
 
 TEST_F(LinkLocal, TheScopeFollowsTheNetworkSettingsOfTheFirstCall)
 {

@@ -7,9 +7,7 @@
 namespace
 {
 
-class Completion : public Ctl
-{
-};
+using Completion = Ctl;
 
 // What is offered for the last of the words, which may be empty.
 std::string offered(const std::string &words)

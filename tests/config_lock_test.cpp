@@ -67,26 +67,31 @@ bool is_lock(const std::string &path)
 std::vector<std::string> moved_aside()
 {
     std::vector<std::string> found;
-    for (const auto &entry : fs::directory_iterator("/tmp")) {
+    for (const auto &entry : fs::directory_iterator("/tmp"))
         if (entry.path().string().starts_with(LOCK + ".aside.")) found.push_back(entry.path());
-    }
     return found;
 }
 
-void until_told_to_go()
+// Holds a lock, taken in whatever way, until /tmp/go appears; it is taken when the construction is done.
+class Holder : public Child
 {
-    eventually([] { return exists("/tmp/go"); }, 60);
-    write_file("/tmp/released", "");
-}
+public:
+    explicit Holder(const std::function<UniqueFd()> &take)
+        : Child([take] {
+              const UniqueFd held = take();
+              write_file("/tmp/held", "");
+              eventually([] { return exists("/tmp/go"); }, 60);
+              write_file("/tmp/released", "");
+          })
+    {
+        EXPECT_TRUE(eventually([] { return exists("/tmp/held"); }));
+        fs::remove("/tmp/held");
+    }
+};
 
-// Holds a lock, taken in whatever way, until /tmp/go appears.
-std::function<void()> holding(const std::function<UniqueFd()> &take)
+UniqueFd take(const std::string &path = LOCK)
 {
-    return [take] {
-        const UniqueFd held = take();
-        write_file("/tmp/held", "");
-        until_told_to_go();
-    };
+    return rsync_lock_config(path.c_str());
 }
 
 UniqueFd as_older_programs_do(const std::string &path)
@@ -99,13 +104,20 @@ UniqueFd as_older_programs_do(const std::string &path)
 // Takes the lock, and tells whether it was free by then.
 void take_it()
 {
-    const UniqueFd lock = rsync_lock_config(LOCK.c_str());
+    const UniqueFd lock = take();
     write_file("/tmp/got", !lock ? "no lock" : exists("/tmp/released") ? "in turn" : "too early");
 }
 
-bool got_it()
+std::string got()
 {
-    return read_file("/tmp/got").size() > 6;
+    EXPECT_TRUE(eventually([] { return read_file("/tmp/got").size() > 6; }));
+    return read_file("/tmp/got");
+}
+
+testing::AssertionResult waits_for(const Child &child, const std::string &path)
+{
+    if (eventually([&] { return has_open(child.pid(), path); })) return testing::AssertionSuccess();
+    return testing::AssertionFailure() << "nobody waits for " << path;
 }
 
 std::string as_neighbour(const std::string &command)
@@ -116,7 +128,7 @@ std::string as_neighbour(const std::string &command)
 void plant_socket()
 {
     in_child([] {
-        if (setgid(65534) != 0 || setuid(65534) != 0) return 1;
+        become_neighbour();
         sockaddr_un address{};
         address.sun_family = AF_UNIX;
         copy_text(address.sun_path, LOCK);
@@ -125,15 +137,13 @@ void plant_socket()
     });
 }
 
-class ConfigLock : public Ctl
-{
-};
+using ConfigLock = Ctl;
 
 } // namespace
 
 TEST_F(ConfigLock, IsExclusive)
 {
-    const UniqueFd lock = rsync_lock_config(LOCK.c_str());
+    const UniqueFd lock = take();
     ASSERT_TRUE(lock);
     EXPECT_TRUE(is_lock(LOCK));
     const UniqueFd other(open(LOCK.c_str(), O_RDONLY));
@@ -164,7 +174,7 @@ TEST_F(ConfigLock, WhateverElseIsThereGivesWay)
         const ino_t foreign = inode(LOCK);
         ASSERT_NE(foreign, 0U) << plant;
         for (int i = 0; i < 2; ++i) {
-            EXPECT_TRUE(rsync_lock_config(LOCK.c_str())) << plant;
+            EXPECT_TRUE(take()) << plant;
             EXPECT_TRUE(is_lock(LOCK)) << plant;
             ASSERT_EQ(moved_aside().size(), 1U) << plant;
         }
@@ -177,102 +187,85 @@ TEST_F(ConfigLock, WhateverElseIsThereGivesWay)
     SetUp();
     shell(as_neighbour("mkdir " + LOCK));
     const ReadOnly no_guard("/run");
-    EXPECT_FALSE(rsync_lock_config(LOCK.c_str()));
+    EXPECT_FALSE(take());
     EXPECT_EQ(errno, EROFS);
     EXPECT_TRUE(moved_aside().empty());
 }
 
 TEST_F(ConfigLock, NobodyWaitsForANeighboursFile)
 {
-    const Child neighbour(holding([] {
-        if (setgid(65534) != 0 || setuid(65534) != 0) _exit(1);
-        UniqueFd file(open(LOCK.c_str(), O_RDWR | O_CREAT, 0644));
-        flock(file.get(), LOCK_EX);
-        return file;
-    }));
-    ASSERT_TRUE(eventually([] { return exists("/tmp/held"); }));
-    const Child waiter(take_it);
-    ASSERT_TRUE(eventually(got_it));
-    EXPECT_EQ(read_file("/tmp/got"), "too early") << "the neighbour still holds what was his";
+    const Holder neighbour([] {
+        become_neighbour();
+        write_file(LOCK, "");
+        return as_older_programs_do(LOCK);
+    });
+    take_it();
+    EXPECT_EQ(got(), "too early") << "the neighbour still holds what was his";
 }
 
 TEST_F(ConfigLock, OneThatOthersCouldOpenIsMendedAndHonoured)
 {
     shell("umask 022; touch " + LOCK);
     const ino_t older = inode(LOCK);
-    const Child holder(holding([] { return as_older_programs_do(LOCK); }));
-    ASSERT_TRUE(eventually([] { return exists("/tmp/held"); }));
+    const Holder holder([] { return as_older_programs_do(LOCK); });
     const Child waiter(take_it);
-    ASSERT_TRUE(eventually([&] { return has_open(waiter.pid(), LOCK); }));
+    ASSERT_TRUE(waits_for(waiter, LOCK));
     EXPECT_TRUE(is_lock(LOCK));
     EXPECT_NE(shell(as_neighbour("flock --nonblock " + LOCK + " true") + " 2>/dev/null").status, 0);
     write_file("/tmp/go", "");
-    ASSERT_TRUE(eventually(got_it));
-    EXPECT_EQ(read_file("/tmp/got"), "in turn");
+    EXPECT_EQ(got(), "in turn");
     EXPECT_EQ(inode(LOCK), older);
 }
 
 TEST_F(ConfigLock, OneThatIsReplacedInAWaitIsWaitedForAnew)
 {
-    const Child holder(holding([] { return rsync_lock_config(LOCK.c_str()); }));
-    ASSERT_TRUE(eventually([] { return exists("/tmp/held"); }));
+    const Holder holder([] { return take(); });
     const Child waiter(take_it);
-    ASSERT_TRUE(eventually([&] { return has_open(waiter.pid(), LOCK); }));
+    ASSERT_TRUE(waits_for(waiter, LOCK));
     fs::rename(LOCK, "/tmp/replaced");
-    UniqueFd newer = rsync_lock_config(LOCK.c_str());
+    UniqueFd newer = take();
     write_file("/tmp/go", "");
-    EXPECT_TRUE(eventually([&] { return has_open(waiter.pid(), LOCK); }));
+    EXPECT_TRUE(waits_for(waiter, LOCK));
     EXPECT_FALSE(exists("/tmp/got"));
     newer.reset();
-    ASSERT_TRUE(eventually(got_it));
+    got();
 }
 
-// Where the kernel lets a neighbour give another name to a file that he cannot open.
-// He opened the file while everybody could, and the process that locked it has ended.
+// He opened the file while everybody could.
 TEST_F(ConfigLock, ANeighbourWhoGotHoldOfAnOldLockIsPassedBy)
 {
     write_file(LOCK, "");
     fs::permissions(LOCK, fs::perms(0644));
-    shell("setpriv --reuid 65534 --regid 65534 --clear-groups "
-          "sh -c 'exec 9<" +
-          LOCK +
-          "; flock -x 9; exec sleep 60' >/dev/null 2>&1 & "
-          "until ! flock -n " +
-          LOCK + " true; do sleep 0.01; done");
-    const UniqueFd lock = rsync_lock_config(LOCK.c_str());
-    EXPECT_TRUE(lock);
-    EXPECT_EQ(octal_mode(LOCK), "600");
-    EXPECT_NE(shell("flock -n " + LOCK + " true").status, 0) << "it is the one at the path";
-    shell("pkill -u 65534 sleep");
+    const Holder neighbour([] {
+        become_neighbour();
+        return as_older_programs_do(LOCK);
+    });
+    take_it();
+    EXPECT_EQ(got(), "too early");
+    EXPECT_TRUE(is_lock(LOCK));
 }
 
+// Where the kernel lets a neighbour give another name to a file that he cannot open.
 TEST_F(ConfigLock, AnHonestHolderOfOneWithTwoNamesIsWaitedFor)
 {
-    const Child holder(holding([] { return rsync_lock_config(LOCK.c_str()); }));
-    ASSERT_TRUE(eventually([] { return exists("/tmp/held"); }));
+    const Holder holder([] { return take(); });
     fs::create_hard_link(LOCK, "/tmp/second");
     const Child waiter(take_it);
-    const std::string handles = "ls -l /proc/" + std::to_string(waiter.pid()) + "/fd 2>/dev/null";
-    ASSERT_TRUE(eventually([&] { return got_it() || contains(shell(handles).output, LOCK); }));
+    // By now it may have another name still.
+    ASSERT_TRUE(eventually([&] { return has_open(waiter.pid(), "/tmp/second"); }));
     write_file("/tmp/go", "");
-    ASSERT_TRUE(eventually(got_it));
-    EXPECT_EQ(read_file("/tmp/got"), "in turn");
+    EXPECT_EQ(got(), "in turn");
     EXPECT_TRUE(is_lock(LOCK));
 
     // A daemon holds a file of its own for ever.
     fs::remove("/tmp/go");
-    const Child daemon(holding([] {
+    const Holder daemon([] {
         write_file("/tmp/daemon.pid", "1");
         return as_older_programs_do("/tmp/daemon.pid");
-    }));
-    ASSERT_TRUE(eventually([&] {
-        return !shell("grep 'FLOCK.*:'$(stat -c %i /tmp/daemon.pid)' ' "
-                      "/proc/locks")
-                    .output.empty();
-    }));
+    });
     fs::remove(LOCK);
     fs::create_hard_link("/tmp/daemon.pid", LOCK);
-    EXPECT_TRUE(rsync_lock_config(LOCK.c_str()));
+    EXPECT_TRUE(take());
     EXPECT_EQ(octal_mode("/tmp/daemon.pid"), "644");
 }
 
@@ -283,9 +276,8 @@ TEST_F(ConfigLock, WithoutOneARunGoesOnAndPeopleChangeNothing)
     const ReadOnly nothing_is_made("/tmp");
     const std::string why = LOCK + " cannot be locked: Read-only file system";
     for (const char *change : {"set daily retry=7", "disable daily", "schedule daily '0 3 * * *'",
-                               "add b remote_ip=a remote_path=b local_path=/mnt/HD/HD_a2/Public"}) {
+                               "add b remote_ip=a remote_path=b local_path=/mnt/HD/HD_a2/Public"})
         EXPECT_TRUE(says(ctl(change), 3, "bakjobctl: " + why + "; nothing is changed\n")) << change;
-    }
     EXPECT_EQ(read_file(STORE), before);
     EXPECT_FALSE(exists(CRON));
     EXPECT_TRUE(says(ctl("show daily"), 0, "daily"));
@@ -297,35 +289,31 @@ TEST_F(ConfigLock, WithoutOneARunGoesOnAndPeopleChangeNothing)
 TEST_F(ConfigLock, PeopleAreToldWhatTheyWaitFor)
 {
     add_job({});
-    const Child holder(holding([] {
+    const Holder holder([] {
         prctl(PR_SET_NAME, "ev\033il (x");
-        return rsync_lock_config(LOCK.c_str());
-    }));
-    ASSERT_TRUE(eventually([] { return exists("/tmp/held"); }));
+        return take();
+    });
     const Child person([] { _exit(shell("bakjobctl set daily retry=7 >/tmp/said 2>&1").status); });
     const std::string told = "bakjobctl: waiting for " + LOCK + ", which process " +
                              std::to_string(holder.pid()) + " (ev?il (x) holds\n";
     EXPECT_TRUE(eventually([&] { return read_file("/tmp/said") == told; })) << read_file("/tmp/said");
     EXPECT_EQ(job_key(1, "retry"), "0");
     write_file("/tmp/go", "");
-    int status = -1;
-    waitpid(person.pid(), &status, 0);
-    EXPECT_EQ(status, 0);
+    EXPECT_EQ(wait_for(person.pid()), 0);
     EXPECT_EQ(job_key(1, "retry"), "7");
     EXPECT_EQ(read_file("/tmp/said"), told) << "once";
 }
 
 TEST_F(ConfigLock, ADiscoveryLooksAloneAtItsCopy)
 {
-    const Fake ssh("/usr/sbin/ssh", "echo >>/tmp/calls; echo '[ m ]'; echo 'path = /m'\n");
+    const Fake ssh(SSH, "echo >>/tmp/calls; echo '[ m ]'; echo 'path = /m'\n");
     shell(as_neighbour(std::string("mkdir ") + DISCOVERY_LOCK_FILE));
     CurrentJob = make_job("daily");
     CurrentJob.server_type = 1;
     copy_text(CurrentJob.ssh_pwd, "c3No");
-    const Child other(holding([] { return rsync_lock_config(DISCOVERY_LOCK_FILE); }));
-    ASSERT_TRUE(eventually([] { return exists("/tmp/held"); }));
+    const Holder other([] { return take(DISCOVERY_LOCK_FILE); });
     const Child discovery(rsync_discover_remote);
-    EXPECT_TRUE(eventually([&] { return has_open(discovery.pid(), DISCOVERY_LOCK_FILE); }));
+    EXPECT_TRUE(waits_for(discovery, DISCOVERY_LOCK_FILE));
     EXPECT_FALSE(exists("/tmp/calls"));
     write_file("/tmp/go", "");
     EXPECT_TRUE(eventually([] { return exists("/tmp/calls"); }));

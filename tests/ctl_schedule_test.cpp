@@ -1,17 +1,10 @@
 // Timetables: the configuration and the scheduler say the same, or people are told.
 
-#include "config/job_list.h"
 #include "config/job_operations.h"
-#include "config/job_store.h"
 #include "config/schedule.h"
 #include "ctl_support.h"
-#include "platform/config_store.h"
 
-#include <array>
 #include <filesystem>
-#include <optional>
-#include <sys/inotify.h>
-#include <unistd.h>
 
 using namespace bakjob;
 namespace fs = std::filesystem;
@@ -21,58 +14,34 @@ namespace
 
 constexpr const char *OF_DAILY = "0 3 * * * root /usr/sbin/bakjob -r 'daily'\n";
 
-class CtlSchedule : public Ctl
+class CtlSchedule : public CtlDaily
 {
 protected:
-    void SetUp() override
-    {
-        Ctl::SetUp();
-        ASSERT_TRUE(says(add("daily"), 0, ""));
-    }
-
     static Ran schedule() { return ctl("schedule daily '0 3 * * *'"); }
 };
 
-// How often a file of a folder was replaced while this lives.
-class Replacements
+TEST_F(CtlSchedule, AJobHasOneTimetableAndKeepsItToItself)
 {
-public:
-    explicit Replacements(const char *folder) : events_(inotify_init1(IN_NONBLOCK))
-    {
-        // Events that are the same as the one before are dropped, so every other one is of another kind.
-        inotify_add_watch(events_, folder, IN_MOVED_FROM | IN_MOVED_TO);
+    for (const char *name : {"\"it's 100%\"", "dailyy"}) {
+        ASSERT_TRUE(says(add(name), 0, ""));
+        ASSERT_TRUE(says(ctl("schedule " + std::string(name) + " '1 2 * * *'"), 0, ""));
     }
-    Replacements(const Replacements &) = delete;
-    Replacements &operator=(const Replacements &) = delete;
-    ~Replacements() { close(events_); }
+    for (const char *first : {"1 2 * * *", "*/5 0-6/2,23 1 JAN,7 mon-5"})
+        ASSERT_TRUE(says(ctl("schedule daily '" + std::string(first) + "'"), 0, ""));
+    const std::string of_others = "1 2 * * * root /usr/sbin/bakjob -r 'it'\\''s 100\\%' # 'it's 100\\%'\n"
+                                  "1 2 * * * root /usr/sbin/bakjob -r 'dailyy'\n";
+    EXPECT_EQ(read_file(CRON), of_others + "*/5 0-6/2,23 1 JAN,7 mon-5 root /usr/sbin/bakjob -r 'daily'\n");
+    EXPECT_TRUE(says(ctl("show daily"), 0, "timetable             */5 0-6/2,23 1 JAN,7 mon-5"));
 
-    [[nodiscard]] int count() const
-    {
-        alignas(inotify_event) std::array<char, 4096> events{};
-        const ssize_t length = read(events_, events.data(), events.size());
-        int count = 0;
-        for (ssize_t at = 0; at < length;) {
-            const auto *event = reinterpret_cast<const inotify_event *>(events.data() + at); // NOLINT
-            if ((event->mask & IN_MOVED_TO) != 0) ++count;
-            at += static_cast<ssize_t>(sizeof *event + event->len);
-        }
-        return count;
-    }
-
-private:
-    int events_;
-};
-
-TEST_F(CtlSchedule, ATimetableIsSavedOnceAndHandedOverOnce)
-{
-    const Replacements saves("/etc/NAS_CFG");
-    const Replacements hand_overs("/etc/cron.d");
-    EXPECT_TRUE(says(schedule(), 0, ""));
-    EXPECT_EQ(saves.count(), 1) << "whoever ends the command leaves all of it or nothing";
-    EXPECT_EQ(hand_overs.count(), 1);
-    EXPECT_EQ(read_file(CRON), OF_DAILY);
     EXPECT_EQ(job_key(1, "schedule_mode"), "1");
     EXPECT_EQ(read_file(FLASH), read_file(STORE));
+    ASSERT_TRUE(says(ctl("unschedule daily"), 0, ""));
+    ASSERT_TRUE(says(ctl("set daily schedule_mode=once"), 0, ""));
+    EXPECT_EQ(read_file(CRON), of_others);
+    for (const char *name : {"dailyy", "\"it's 100%\""})
+        ASSERT_TRUE(says(ctl(std::string("delete ") + name), 0, ""));
+    EXPECT_EQ(read_file(CRON), "");
+    EXPECT_EQ(ctl("list --names").output, "daily\n");
 }
 
 TEST_F(CtlSchedule, WhatTheSchedulerDidNotTakeIsToldAndHandedOverByTheSameCommand)
@@ -109,17 +78,22 @@ TEST_F(CtlSchedule, TheSchedulerGoesByTheFileWhenASaveOrTheFlashFails)
     store_set("/system_mgr/crond/rsync/count", "2");
     store_set("/system_mgr/crond/rsync/item:2/run", "/usr/sbin/bakjob -r 'nobody'");
     store_save();
+    const std::string before = read_file(STORE);
     {
         const ReadOnly config("/etc/NAS_CFG");
-        EXPECT_EQ(ctl("schedule daily '9 9 * * *'").status, 3);
-        EXPECT_EQ(read_file(CRON), OF_DAILY);
+        for (const char *change :
+             {"set daily retry=1", "delete daily", "schedule daily '9 9 * * *'", "unschedule daily"}) {
+            EXPECT_EQ(ctl(change).status, 3) << change;
+            EXPECT_EQ(read_file(CRON), OF_DAILY) << change;
+        }
         EXPECT_EQ(rsync_delete_job("daily"), 1);
         EXPECT_EQ(read_file(CRON), OF_DAILY) << "the job is still there, and so is its timetable";
     }
-    ASSERT_TRUE(says(ctl("set daily retry=1"), 0, ""));
+    EXPECT_EQ(read_file(STORE), before);
     fs::remove_all("/var/lib/device_flash");
     write_file("/var/lib/device_flash", "no folder");
     EXPECT_TRUE(says(ctl("schedule daily '9 9 * * *'"), 3, "could not be copied to flash"));
+    EXPECT_TRUE(says(ctl("set daily retry=1"), 3, "could not be copied to flash"));
     EXPECT_EQ(read_file(CRON), "9 9 * * * root /usr/sbin/bakjob -r 'daily'\n");
     fs::remove("/var/lib/device_flash");
 }
@@ -185,7 +159,7 @@ TEST_F(CtlSchedule, DeleteTakesAwayWhatTheJobLeft)
     for (const std::string &path : left)
         EXPECT_FALSE(exists(path)) << path;
     EXPECT_TRUE(exists("/tmp/r_daily2.passwd"));
-    EXPECT_TRUE(exists("/mnt/HD/HD_a2/Public/a"));
+    EXPECT_TRUE(exists(SHARE + "/file"));
 
     write_file(left.back(), "state 4 -\n");
     ASSERT_TRUE(says(add("daily"), 0, ""));

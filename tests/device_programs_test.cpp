@@ -1,12 +1,12 @@
 // The stand-in programs, against the real rsync daemon and the real ssh server of the remote side.
 
-#include "support.h"
+#include "process_support.h"
 
 #include <algorithm>
-#include <string>
-#include <sys/types.h>
-#include <utility>
-#include <vector>
+#include <filesystem>
+#include <unistd.h>
+
+namespace fs = std::filesystem;
 
 namespace
 {
@@ -63,9 +63,7 @@ TEST_F(Programs, SshSaysFirstWhatTheStockClientHasToSay)
         EXPECT_EQ(first_line("/usr/sbin/ssh " + arguments), line) << arguments;
     }
     EXPECT_EQ(first_line("/usr/sbin/ssh -d cm9vdHB3 root@127.0.0.1 echo again"), "again");
-    if (!far_end().empty()) {
-        EXPECT_EQ(first_line("/usr/sbin/ssh -d cm9vdHB3 root@" + far_end() + " echo far"), "far");
-    }
+    EXPECT_EQ(first_line("/usr/sbin/ssh -d cm9vdHB3 root@" + far_end() + " echo far"), "far");
 
     shell("ssh-keygen -q -t ed25519 -N '' -f /tmp/key && (printf '127.0.0.1 '; cat /tmp/key.pub) "
           ">~root/.ssh/known_hosts");
@@ -96,18 +94,16 @@ TEST_F(Programs, ATransferShowsItsJobInEveryProcess)
         processes = shell("ps -ww").output;
         return count_lines(processes, parts) == 4;
     })) << processes;
-    for (const std::string &line : lines_of(processes)) {
+    for (const std::string &line : lines_of(processes))
         if (line.find("job-name=my job") != std::string::npos)
             shell("kill " + std::to_string(std::stol(line)));
-    }
     EXPECT_TRUE(eventually([&] { return count_lines(shell("ps").output, parts) == 0; }));
 }
 
 TEST_F(Programs, ATransferPublishesItsFigures)
 {
-    for (int i = 0; i < 30; ++i) {
+    for (int i = 0; i < 30; ++i)
         write_file("/mnt/HD/x/" + std::to_string(i), std::string(1000, 'x'));
-    }
     write_file("/tmp/other", "untouched");
     shell("ln -s /tmp/other '/tmp/r_it'\\''s 1'; ln -s /tmp/other '/tmp/r_it'\\''s 1.dump_size'");
     const std::string rsync = "/usr/sbin/rsync --job-name=it\\'s\\ 1 -aHq8 --dump-size ";
@@ -154,6 +150,70 @@ TEST_F(Programs, PsShowsOneLineAProcessOfAnyLength)
         processes = shell("ps -ww").output;
         return count_lines(processes, {"sleep 5; : \"a b\" zzz", "zzz end"}) == 1;
     })) << processes.substr(0, 2000);
+}
+
+constexpr const char *BOUND = "BAKJOB_RUN=1 DEVICE_PROBE_SECONDS=1 ";
+
+TEST_F(Programs, AProbeEndsWhateverGoesOnForEver)
+{
+    // One byte in a while, and lines without end behind a greeting.
+    const BadServer drips(
+        [](int c) {
+            while (write(c, "x", 1) == 1)
+                usleep(200'000);
+        },
+        8731);
+    const BadServer lists(
+        [](int c) {
+            (void)!write(c, "@RSYNCD: 31.0\n", 14);
+            while (write(c, "module\n", 7) == 7)
+                usleep(1000);
+        },
+        8732);
+    ASSERT_TRUE(drips.bound() && lists.bound());
+    struct Case {
+        std::string command;
+        std::string status;
+        std::string says;
+    };
+    const std::vector<Case> cases = {
+        {"rsync --port=8731 127.0.0.9::", "30\n", ""},
+        {"rsync --port=8732 127.0.0.9::", "30\n", "module"},
+        {"ssh -d cm9vdHB3 root@127.0.0.1 'while echo line; do sleep 0.1; done'", "255\n", "line"},
+        {"rsync -n -e 'sh -c \"setsid sleep 4711 & sleep 4711\"' x:y /tmp", "30\n", ""}};
+    int number = 0;
+    for (const Case &one : cases) {
+        const std::string file = "/tmp/" + std::to_string(++number);
+        shell("/usr/sbin/" + one.command + " >/tmp/unmarked 2>&1 </dev/null & echo $! >" + file + ".pid");
+        shell("{ " + (BOUND + ("timeout 20 /usr/sbin/" + one.command)) + " >" + file + " 2>&1; echo $? >" +
+              file + ".status; } >/dev/null 2>&1 &");
+    }
+    number = 0;
+    for (const Case &one : cases) {
+        const std::string file = "/tmp/" + std::to_string(++number);
+        EXPECT_TRUE(eventually([&] { return read_file(file + ".status") == one.status; })) << one.command;
+        EXPECT_TRUE(read_file(file).starts_with(one.says)) << one.command;
+        EXPECT_FALSE(has(read_file(file), "error")) << one.command;
+        EXPECT_EQ(shell("kill $(cat " + file + ".pid)").status, 0) << "nobody's probe: " << one.command;
+    }
+    end_waits();
+    EXPECT_TRUE(eventually([] { return left_processes().empty(); })) << left_processes();
+}
+
+TEST_F(Programs, TheBoundOfAProbeChangesNothingElse)
+{
+    const std::string ssh = BOUND + SSH + " -d cm9vdHB3 root@127.0.0.1 ";
+    EXPECT_EQ(shell(ssh + "'echo x; exit 7'").status, 7);
+    EXPECT_EQ(shell("echo in | " + ssh + "cat").output, "in\n");
+    EXPECT_EQ(shell(BOUND + RSYNC + " /no/such/file /tmp 2>/dev/null").status, 23);
+
+    // Transfers take as long as they take.
+    write_file("/tmp/from/file", std::string(15'000, 'x'));
+    const std::string transfer =
+        BOUND + RSYNC + " --job-name=daily --bwlimit=10 -aq8 -e '/usr/sbin/ssh -d cm9vdHB3' /tmp/from/file ";
+    shell(transfer + "/tmp/here & " + transfer + "root@127.0.0.1:/tmp/there; wait");
+    EXPECT_EQ(fs::file_size("/tmp/here"), 15'000U);
+    EXPECT_EQ(fs::file_size("/tmp/there"), 15'000U);
 }
 
 } // namespace

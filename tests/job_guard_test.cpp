@@ -7,7 +7,6 @@
 
 #include <cerrno>
 #include <csignal>
-#include <cstring>
 #include <fcntl.h>
 #include <filesystem>
 #include <sys/file.h>
@@ -18,17 +17,24 @@
 using namespace bakjob;
 namespace fs = std::filesystem;
 
-class Guard : public Appliance
-{
-};
+using Guard = Appliance;
+using State = Appliance;
+using RecoverListing = Appliance;
 
-class State : public Appliance
+namespace
 {
-};
 
-class RecoverListing : public Appliance
+// A process that shows itself like that.
+pid_t sleeper(const std::string &name)
 {
-};
+    const pid_t child = fork();
+    if (child == 0) execl("/bin/sleep", name.c_str(), "4711", nullptr);
+    const std::string command = "/proc/" + std::to_string(child) + "/cmdline";
+    EXPECT_TRUE(eventually([&] { return read_file(command).starts_with(name); }));
+    return child;
+}
+
+} // namespace
 
 TEST_F(Guard, ThePidFileIsMadeByOneRunAlone)
 {
@@ -64,47 +70,30 @@ TEST_F(Guard, KillingTakesTheProcessInThePidFileAndNothingElse)
     }
     for (const bool restore : {false, true}) {
         run_options = {};
-        const pid_t victim = fork();
-        if (victim == 0) {
-            execl("/bin/sleep", restore ? "bakjob -i / -r x" : "bakjob -r x", "4711", nullptr);
-        }
+        const pid_t victim = sleeper(restore ? "bakjob -i / -r x" : "bakjob -r x");
         write_file("/var/run/bakjob_a b.pid", std::to_string(victim) + "\n");
-        usleep(50'000);
         EXPECT_EQ(rsync_kill_job_process(named("a b")), 0);
-        int status = 0;
-        ASSERT_EQ(waitpid(victim, &status, 0), victim);
-        EXPECT_TRUE(WIFSIGNALED(status));
+        EXPECT_GT(wait_for(victim), 128);
         EXPECT_EQ(run_options.restore_mode, restore ? 1 : 0);
     }
 }
 
 TEST_F(Guard, TransfersAreFoundByTheirJobsNameTakenLiterally)
 {
-    struct Case {
-        std::string running;
-        std::string killed;
-        bool ends;
-    };
-    const std::vector<Case> cases = {{"daily", "daily", true},     {"daily", "weekly", false},
-                                     {"a.b", "a.b", true},         {"axb", "a.b", false},
-                                     {"it's $x", "it's $x", true}, {"^x$", "^x$", true},
-                                     {"b [1]", "b [1]", true},     {"b 1", "b [1]", false}};
-    for (const Case &one : cases) {
-        const pid_t transfer = fork();
-        if (transfer == 0) {
-            const std::string name = "/usr/sbin/rsync --job-name=" + one.running;
-            execl("/bin/sleep", name.c_str(), "4711", nullptr);
-        }
-        usleep(20'000);
-        rsync_kill_transfers(named(one.killed));
-        int status = 0;
+    // Whether a kill of the second job's transfers ends one of the first's.
+    const std::map<std::pair<std::string, std::string>, bool> cases = {
+        {{"daily", "daily"}, true}, {{"daily", "weekly"}, false},   {{"a.b", "a.b"}, true},
+        {{"axb", "a.b"}, false},    {{"it's $x", "it's $x"}, true}, {{"^x$", "^x$"}, true},
+        {{"b [1]", "b [1]"}, true}, {{"b 1", "b [1]"}, false}};
+    for (const auto &[names, ends] : cases) {
+        const pid_t transfer = sleeper("/usr/sbin/rsync --job-name=" + names.first);
+        rsync_kill_transfers(named(names.second));
         const bool ended =
-            eventually([&] { return waitpid(transfer, &status, WNOHANG) == transfer; }, one.ends ? 5 : 0);
-        EXPECT_EQ(ended, one.ends) << one.running << " " << one.killed;
-        if (!ended) {
-            kill(transfer, SIGKILL);
-            waitpid(transfer, &status, 0);
-        }
+            eventually([&] { return waitpid(transfer, nullptr, WNOHANG) == transfer; }, ends ? 5 : 0);
+        EXPECT_EQ(ended, ends) << names.first << " " << names.second;
+        if (ended) continue;
+        kill(transfer, SIGKILL);
+        wait_for(transfer);
     }
     const Fake ps("/usr/local/sbin/ps", "[ \"$1\" = -ww ] && exit 1\n");
     EXPECT_EQ(rsync_ps_command(), "ps");
@@ -118,15 +107,15 @@ TEST_F(State, GoesToTheDirectionOfTheRun)
     const std::string time = job_key(1, "last_do_job_time");
     std::tm parsed{};
     EXPECT_NE(strptime(time.c_str(), "%a %b %d %Y %I:%M:%S %p", &parsed), nullptr) << time;
-    EXPECT_EQ(read_file("/var/lib/device_flash/config.xml"), read_file("/etc/NAS_CFG/config.xml"));
+    EXPECT_EQ(read_file(FLASH), read_file(STORE));
     run_options.restore_mode = 1;
     rsync_set_job_state("a", JOB_FAILED);
     EXPECT_EQ(job_key(1, "state") + job_key(1, "rstate"), "34");
     EXPECT_EQ(job_key(1, "last_do_job_time"), time);
 
-    const std::string before = read_file("/etc/NAS_CFG/config.xml");
+    const std::string before = read_file(STORE);
     rsync_set_job_state("unknown", JOB_DONE);
-    EXPECT_EQ(read_file("/etc/NAS_CFG/config.xml"), before);
+    EXPECT_EQ(read_file(STORE), before);
 }
 
 TEST_F(State, OnlyStaleStatesAreReset)
@@ -147,41 +136,38 @@ TEST_F(State, OnlyStaleStatesAreReset)
     }
     EXPECT_EQ(job_key(10, "state") + job_key(10, "rstate"), "312");
 
-    fs::remove("/var/lib/device_flash/config.xml");
-    const auto written = fs::last_write_time("/etc/NAS_CFG/config.xml");
+    fs::remove(FLASH);
+    const auto written = fs::last_write_time(STORE);
     EXPECT_EQ(bakjob_program("-a").status, 0);
-    EXPECT_EQ(fs::last_write_time("/etc/NAS_CFG/config.xml"), written) << "nothing stale, nothing written";
-    EXPECT_FALSE(exists("/var/lib/device_flash/config.xml"));
+    EXPECT_EQ(fs::last_write_time(STORE), written) << "nothing stale, nothing written";
+    EXPECT_FALSE(exists(FLASH));
 }
 
 TEST_F(RecoverListing, NumbersTheSnapshotsInNameOrder)
 {
-    const std::string folder = "/mnt/HD/HD_a2/Public";
-    add_job({{"job_name", "job"}, {"backup_type", "2"}, {"inc_enable", "1"}, {"local_path", folder}});
+    add_job({{"job_name", "job"}, {"backup_type", "2"}, {"inc_enable", "1"}, {"local_path", SHARE}});
     EXPECT_EQ(rsync_list_snapshots("job"), 0) << "no folder";
-    fs::create_directories(folder);
+    fs::create_directories(SHARE);
     EXPECT_EQ(rsync_list_snapshots("job"), 0) << "nothing in it";
-    write_file(folder + "/job.log", "no folder");
+    write_file(SHARE + "/job.log", "no folder");
     EXPECT_EQ(rsync_list_snapshots("job"), 1);
     EXPECT_EQ(recover_list.count, 0);
     for (const char *name : {"job.x", "job.2", "job.0", "job.1", "jobs.0", "backup.0", ".job.0"})
-        fs::create_directories(folder + "/" + name);
-    shell("touch -d '2040-05-06 07:08:09' " + folder + "/job.1"); // beyond what 32 bits can tell
+        fs::create_directories(SHARE + "/" + name);
+    shell("touch -d '2040-05-06 07:08:09' " + SHARE + "/job.1"); // beyond what 32 bits can tell
     run_options.debug_mode = 1;
-    testing::internal::CaptureStdout();
-    EXPECT_EQ(rsync_list_snapshots("job"), 1);
-    const auto trace = lines_of(testing::internal::GetCapturedStdout());
+    const auto trace = lines_of(printed_by([] { EXPECT_EQ(rsync_list_snapshots("job"), 1); }));
     ASSERT_EQ(trace.size(), 5U);
     EXPECT_EQ(trace[4], "scan file num [4]");
     for (int i = 0; i < 3; ++i) {
-        EXPECT_EQ(recover_list.entries[i].path, folder + "/job." + std::to_string(i));
+        EXPECT_EQ(recover_list.entries[i].path, SHARE + "/job." + std::to_string(i));
         EXPECT_EQ(trace[static_cast<std::size_t>(i)], "[" + std::to_string(i + 1) + ". " +
                                                           recover_list.entries[i].time + ": " +
                                                           recover_list.entries[i].path + "]");
     }
     EXPECT_STREQ(recover_list.entries[1].time, "2040-05-06 07:08:09");
     for (int i = 3; i < 12; ++i)
-        fs::create_directories(folder + "/job." + std::to_string(i));
+        fs::create_directories(SHARE + "/job." + std::to_string(i));
     rsync_list_snapshots("job");
     EXPECT_EQ(recover_list.count, 10);
     EXPECT_EQ(recover_list.entries[9].seq, 10);
@@ -189,13 +175,11 @@ TEST_F(RecoverListing, NumbersTheSnapshotsInNameOrder)
 
 TEST_F(RecoverListing, TakesOnlyEnabledIncrementalPulls)
 {
-    const std::string folder = "/mnt/HD/HD_a2/Public";
-    fs::create_directories(folder + "/job.0");
     for (const auto &[key, value] :
          Keys{{"backup_type", "1"}, {"inc_enable", "0"}, {"enable", "0"}, {"local_path", ""}}) {
         SetUp();
-        fs::create_directories(folder + "/job.0");
-        Keys keys{{"job_name", "job"}, {"backup_type", "2"}, {"inc_enable", "1"}, {"local_path", folder}};
+        fs::create_directories(SHARE + "/job.0");
+        Keys keys{{"job_name", "job"}, {"backup_type", "2"}, {"inc_enable", "1"}, {"local_path", SHARE}};
         keys[key] = value;
         add_job(keys);
         EXPECT_EQ(rsync_list_snapshots("job"), 0) << key;

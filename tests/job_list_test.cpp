@@ -4,11 +4,12 @@
 #include "config/job_store.h"
 #include "support.h"
 
-using namespace bakjob;
+#include <filesystem>
 
-class JobList : public Appliance
-{
-};
+using namespace bakjob;
+namespace fs = std::filesystem;
+
+using JobList = Appliance;
 
 namespace
 {
@@ -25,9 +26,8 @@ std::string names()
 
 TEST_F(JobList, KeepsOrderAndTail)
 {
-    for (const auto &[name, added] : {std::pair("a", 1), {"b", 1}, {"a", 0}, {"c", 1}}) {
+    for (const auto &[name, added] : {std::pair("a", 1), {"b", 1}, {"a", 0}, {"c", 1}})
         EXPECT_EQ(rsync_list_add_job(make_job(name)), added) << name;
-    }
     EXPECT_EQ(names(), "a b c ");
     EXPECT_EQ(rsync_find_job("B"), nullptr);
     EXPECT_EQ(rsync_find_job("b "), nullptr);
@@ -109,10 +109,10 @@ TEST_F(JobList, TheStoreKeepsEveryFieldAndNumbersFromOne)
     EXPECT_EQ(job_key(3, "rlast_do_job_time"), "then");
     EXPECT_EQ(job_key(4, "job_name"), "(none)");
 
-    const std::string first = read_file("/etc/NAS_CFG/config.xml");
+    const std::string first = read_file(STORE);
     rsync_load_jobs();
     rsync_save_jobs();
-    EXPECT_EQ(read_file("/etc/NAS_CFG/config.xml"), first) << "a second save changes nothing";
+    EXPECT_EQ(read_file(STORE), first) << "a second save changes nothing";
 
     rsync_load_jobs();
     rsync_list_remove_job(rsync_find_job("two"));
@@ -133,16 +133,15 @@ TEST_F(JobList, LoadingBringsNumbersIntoRange)
         std::string stored;
         int loaded;
     };
-    const std::vector<Case> cases = {{"retry", "16", 0},
-                                     {"retry", "15", 15},
-                                     {"retry", "-1", 0},
-                                     {"retry_interval", "0", 30},
-                                     {"retry_interval", "1", 1},
-                                     {"retry_interval", "180", 180},
-                                     {"retry_interval", "181", 30},
-                                     {"rsync_timeout", "-5", 600},
-                                     {"rsync_timeout", "0", 0}};
-    for (const Case &one : cases) {
+    for (const Case &one : std::vector<Case>{{"retry", "16", 0},
+                                             {"retry", "15", 15},
+                                             {"retry", "-1", 0},
+                                             {"retry_interval", "0", 30},
+                                             {"retry_interval", "1", 1},
+                                             {"retry_interval", "180", 180},
+                                             {"retry_interval", "181", 30},
+                                             {"rsync_timeout", "-5", 600},
+                                             {"rsync_timeout", "0", 0}}) {
         SetUp();
         add_job({{one.key, one.stored}});
         rsync_load_jobs();
@@ -151,7 +150,10 @@ TEST_F(JobList, LoadingBringsNumbersIntoRange)
             EXPECT_EQ(integer_field(*job_list->head, field), one.loaded) << one.key << one.stored;
         }
     }
-    SetUp();
+}
+
+TEST_F(JobList, ALongTextIsKnownToBeCutAndACountIsNotTrusted)
+{
     add_job({{"local_path", std::string(2600, 'x')}});
     store_set("/backup_mgr/rsync/count", "2");
     rsync_load_jobs();
@@ -164,13 +166,13 @@ TEST_F(JobList, LoadingBringsNumbersIntoRange)
     store_save();
     rsync_load_jobs();
     EXPECT_EQ(job_list->count, 2) << "a count beyond all reason ends with what is there";
+
     SetUp();
     add_job({{"local_path", std::string(2599, 'x')}, {"port", std::string(16, '8')}});
-    rsync_load_jobs();
-    EXPECT_FALSE(was_cut(*job_list->head, "local_path"));
-    EXPECT_TRUE(refusal_of_cut_text(*job_list->head)) << "the port";
     for (int save = 0; save < 2; ++save) {
         rsync_load_jobs();
+        EXPECT_FALSE(was_cut(*job_list->head, "local_path"));
+        EXPECT_TRUE(refusal_of_cut_text(*job_list->head)) << "the port";
         rsync_save_jobs();
         EXPECT_EQ(job_key(1, "port"), std::string(16, '8')) << "a save must not make it a usable one";
     }
@@ -192,4 +194,35 @@ TEST_F(JobList, OnlyThePasswordFileIsWrittenBackToTheCaller)
     EXPECT_STREQ(job.rsync_user, "");
     EXPECT_STREQ(job.port, "");
     EXPECT_EQ(job.inc_number, 99);
+}
+
+TEST_F(JobList, ThePasswordFileHoldsWhatTheServerTakes)
+{
+    struct Case {
+        int pwd_encoded;
+        int server_type;
+        std::string password;
+        std::string content; // none: refused
+    };
+    const std::string longest(127, 'p');
+    const std::string path = "/tmp/r_it's $x.passwd";
+    write_file("/tmp/victim", "kept");
+    for (const Case &one : std::vector<Case>{{0, 2, "secret", "secret\n"},
+                                             {0, 1, "secret", "c2VjcmV0\n"},
+                                             {1, 2, "c2VjcmV0", "secret\n"},
+                                             {1, 1, "c2VjcmV0", "c2VjcmV0\n"},
+                                             {0, 2, longest, longest + "\n"},
+                                             {0, 1, longest.substr(33), ""},
+                                             {1, 2, "!", ""}}) {
+        CurrentJob = make_job("it's $x");
+        CurrentJob.pwd_encoded = one.pwd_encoded;
+        CurrentJob.server_type = one.server_type;
+        copy_text(CurrentJob.rsync_pwd, one.password);
+        fs::remove(path);
+        fs::create_symlink("/tmp/victim", path);
+        EXPECT_EQ(rsync_write_password_file(), !one.content.empty());
+        if (one.content.empty()) continue;
+        EXPECT_EQ(read_file(path) + octal_mode(path), one.content + "600");
+    }
+    EXPECT_EQ(read_file("/tmp/victim"), "kept");
 }

@@ -8,24 +8,21 @@
 
 namespace fs = std::filesystem;
 
-TEST_F(Appliance, EmptyFoldersAtOurNamesGiveWay)
+TEST_F(ApplianceWithShare, EmptyFoldersAtOurNamesGiveWay)
 {
-    const std::vector<std::string> names = {"r_daily.passwd", "r_daily", "r_daily.dump_size",
-                                            "rsync_bakcup_src_folder_name.daily"};
-    add_share("Public", "/mnt/HD/HD_a2/Public");
-    write_file("/mnt/HD/HD_a2/Public/file", "x");
-    write_file("/tmp/kv_serial.txt", "S1");
-    add_job({{"ssh_pwd", "cm9vdHB3"}}); // to make the folder that is missing over there
     const std::string copy = "/tmp/remote_rshareinfo_daily.txt";
+    const std::vector<std::string> names = {"/tmp/r_daily.passwd", "/tmp/r_daily", "/tmp/r_daily.dump_size",
+                                            "/tmp/rsync_bakcup_src_folder_name.daily"};
+    add_job({{"ssh_pwd", "cm9vdHB3"}}); // to make the folder that is missing over there
     for (const std::string &name : names)
-        fs::create_directories("/tmp/" + name);
+        fs::create_directories(name);
     fs::create_directories(copy);
     const Ran ran = bakjob_program("-d -r daily");
     EXPECT_EQ(job_key(1, "state"), "2") << ran.output;
     EXPECT_TRUE(exists("/remote/backup/S1_remote_backup/daily/Public/file"));
     EXPECT_FALSE(exists(copy));
     for (const std::string &name : names)
-        EXPECT_TRUE(fs::is_regular_file("/tmp/" + name)) << name;
+        EXPECT_TRUE(fs::is_regular_file(name)) << name;
 
     fs::create_directories("/tmp/rsync_debug");
     bakjob::run_options.debug_mode = 2;

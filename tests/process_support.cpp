@@ -20,12 +20,12 @@ const std::string HOLD = "setsid sleep 4711 & (sleep 4711 &) ; touch /tmp/there;
 
 std::vector<Phase> phases()
 {
-    const char *const rsync = "/usr/sbin/rsync";
+    const auto at = [](const std::string &kind, const std::string &script) {
+        return KIND_OF_CALL + "[ $kind != " + kind + " ] || { " + script + "; }\n";
+    };
     return {
-        {"probe", rsync, "case \"$*\" in *::) " + HOLD + " ;; esac\n"},
-        {"dry run", rsync, "case \"$*\" in *--job-name=*--dry-run*) " + HOLD + " ;; esac\n"},
-        {"transfer", rsync, "case \"$*\" in *--dry-run*|*::) ;; *) " + HOLD + " ;; esac\n"},
-        {"retry wait", rsync, "case \"$*\" in *--dry-run*|*::) ;; *) touch /tmp/there; exit 11 ;; esac\n"},
+        {"probe", RSYNC, at("list", HOLD)},   {"dry run", RSYNC, at("dry", HOLD)},
+        {"transfer", RSYNC, at("run", HOLD)}, {"retry wait", RSYNC, at("run", "touch /tmp/there; exit 11")},
         {"rotation", COPY, HOLD + "\n"},
     };
 }
@@ -44,6 +44,11 @@ std::string left_processes()
     return left;
 }
 
+void end_waits()
+{
+    shell("pkill -9 -f '[s]leep 4711'");
+}
+
 pid_t start_until_there(const std::vector<std::string> &arguments)
 {
     fs::remove("/tmp/there");
@@ -52,13 +57,17 @@ pid_t start_until_there(const std::vector<std::string> &arguments)
     return run;
 }
 
-int status_within(pid_t process, int seconds)
+int result_within(pid_t process, int seconds)
 {
-    int status = 0;
-    if (eventually([&] { return waitpid(process, &status, WNOHANG) == process; }, seconds)) return status;
+    const auto ended = [&] {
+        siginfo_t info = {};
+        waitid(P_PID, static_cast<id_t>(process), &info, WEXITED | WNOHANG | WNOWAIT);
+        return info.si_pid == process;
+    };
+    if (eventually(ended, seconds)) return wait_for(process);
     kill(process, SIGKILL);
-    waitpid(process, nullptr, 0);
-    return 0;
+    wait_for(process);
+    return -1;
 }
 
 std::string left_files()
@@ -71,7 +80,7 @@ std::string left_files()
 JobToHoldUp::JobToHoldUp(const Keys &keys)
 {
     shell(std::string("cp /bin/cp ") + COPY);
-    fs::create_directories(std::string(SHARE) + "/daily.0");
+    fs::create_directories(SHARE + "/daily.0");
     fs::create_directories("/remote/backup/S1_remote_backup/daily/Public");
     Keys all{{"backup_type", "2"}, {"inc_enable", "1"}, {"retry", "3"}, {"retry_interval", "180"}};
     for (const auto &[key, value] : keys)
@@ -81,6 +90,15 @@ JobToHoldUp::JobToHoldUp(const Keys &keys)
 
 JobToHoldUp::~JobToHoldUp()
 {
-    shell("pkill -9 -f '[s]leep 4711'");
+    end_waits();
     fs::remove(COPY);
+}
+
+bool next_run_works()
+{
+    end_waits();
+    shell("rm -rf /tmp/r_*.passwd /tmp/rsync_bakcup* " + SHARE + "/daily.*; mkdir " + SHARE + "/daily.0");
+    const Fake rsync(RSYNC, "");
+    return wait_for(start({"-r", "daily"})) == 0 && job_key(1, "state") == "2" &&
+           fs::remove("/tmp/r_daily.passwd") && !exists(PID_FILE);
 }

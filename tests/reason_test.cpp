@@ -7,127 +7,83 @@
 #include "support.h"
 #include "transfer/plan.h"
 
-#include <filesystem>
-
 using namespace bakjob;
-namespace fs = std::filesystem;
 
 namespace
 {
 
-constexpr const char *FOLDER = "/mnt/HD/HD_a2/Public";
-
 struct Case {
     Keys keys;
     std::string prepared_by; // shell
-    std::string rsync;       // case branches: what it does for one kind of call
+    std::string rsync;       // what it does for a kind of call
     std::string ssh;
     Reason reason; // `seen`: in part
 };
 
-// What rsync is called for: list and write (the probes), dry and run.
-std::string rsync_script(const std::string &branches)
-{
-    return "case $* in\n*--job-name=*--dry-run*) kind=dry ;;\n*--job-name=*) kind=run ;;\n"
-           "*--dry-run*) kind=write ;;\n*) kind=list ;;\nesac\ncase $kind in\n" +
-           branches + "\n*) ;;\nesac\n";
-}
-
-class Reasons : public Appliance
-{
-protected:
-    void SetUp() override
-    {
-        Appliance::SetUp();
-        add_share("Public", FOLDER);
-        store_save();
-        fs::create_directories(FOLDER);
-    }
-};
+using Reasons = ApplianceWithShare;
 
 TEST_F(Reasons, TellWhichStepFailedAndWhatWasSeen)
 {
+    using enum RunStep;
     const std::string refused = "rsync: failed to connect to 10.0.0.1: Connection refused (111)";
     const std::string missing = "rsync: change_dir failed: No such file or directory (2)";
-    const std::string says = "echo \"";
+    const std::string denied = "Permission denied (password).";
+    const std::string none = "/mnt/HD/HD_a2/None";
+    const std::string at_list = "[ $kind != list ] || echo '";
+    const std::string at_write = "[ $kind != write ] || echo '";
+    const std::string at_run = "[ $kind != run ] || exit ";
+    const Keys row = keys_of("backup_type=2 inc_enable=1");
+    const Keys tried_twice = keys_of("retry=2 retry_interval=1");
     const std::vector<Case> cases = {
-        {{{"local_path", "/mnt/HD/HD_a2/None"}},
-         "",
-         "",
-         "",
-         {.step = RunStep::FOLDER, .seen = "no share holds [/mnt/HD/HD_a2/None]"}},
-        {{},
-         std::string("rm -r ") + FOLDER,
-         "",
-         "",
-         {.step = RunStep::FOLDER, .seen = "share [/mnt/HD/HD_a2/Public] cannot be entered: No such file"}},
+        {{{"local_path", none}}, "", "", "", {.step = FOLDER, .seen = "no share holds [" + none + "]"}},
+        {{}, "rm -r " + SHARE, "", "", {.step = FOLDER, .seen = SHARE + "] cannot be entered: No such file"}},
         {{{"remote_path", std::string(1000, 'x')}},
          "",
          "",
          "",
-         {.step = RunStep::FOLDER, .seen = "remote_path refused: too long"}},
-        {{{"backup_type", "2"}, {"inc_enable", "1"}},
-         std::string("ln -s /etc ") + FOLDER + "/daily.1",
-         "",
-         "",
-         {.step = RunStep::FOLDER, .seen = "daily.1] is a link"}},
+         {.step = FOLDER, .seen = "remote_path refused: too long"}},
+        {row, "ln -s /etc " + SHARE + "/daily.1", "", "", {.step = FOLDER, .seen = "daily.1] is a link"}},
         {{{"use_ssh", "1"}},
          "",
          "",
-         says + "Permission denied (password).\"",
-         {.step = RunStep::LOGIN, .seen = "Permission denied (password).", .code = SSH_DENIED}},
-        {{{"rsync_pwd", "?"}, {"pwd_encoded", "1"}},
+         "echo '" + denied + "'",
+         {.step = LOGIN, .seen = denied, .code = SSH_DENIED}},
+        {keys_of("rsync_pwd=? pwd_encoded=1"),
          "",
          "",
          "",
-         {.step = RunStep::PASSWORD, .seen = "rsync_pwd refused: it has no plain form"}},
-        {{},
-         "",
-         "list) " + says + refused + "\" ;;",
-         "",
-         {.step = RunStep::DAEMON, .seen = refused, .code = REPLY_REFUSED}},
+         {.step = PASSWORD, .seen = "rsync_pwd refused: it has no plain form"}},
+        {{}, "", at_list + refused + "'", "", {.step = DAEMON, .seen = refused, .code = REPLY_REFUSED}},
         {{{"backup_type", "2"}},
          "",
-         "write) " + says + missing + "\" ;;",
+         at_write + missing + "'",
          "",
-         {.step = RunStep::TARGET, .seen = missing, .code = REPLY_NO_DIR}},
+         {.step = TARGET, .seen = missing, .code = REPLY_NO_DIR}},
         {{{"remote_path", "backup/sub"}},
          "",
-         "write) " + says + missing + "\" ;;",
+         at_write + missing + "'",
          "exit 255",
-         {.step = RunStep::TARGET, .seen = "was not fetched: exit code 255", .code = REPLY_NO_DIR}},
+         {.step = TARGET, .seen = "was not fetched: exit code 255", .code = REPLY_NO_DIR}},
         {{{"remote_path", "a*b"}},
          "",
          "",
          "",
-         {.step = RunStep::COMMAND, .seen = "remote_path refused: character special to the shell"}},
-        {{}, "", "dry) exit 10 ;;", "", {.step = RunStep::DRY_RUN, .exit_code = 10, .attempt = 1}},
-        {{{"retry", "2"}, {"retry_interval", "1"}},
-         "",
-         "run) exit 11 ;;",
-         "",
-         {.step = RunStep::TRANSFER, .exit_code = 11, .attempt = 2}},
-        {{{"retry", "2"}},
-         "",
-         "run) exit 23 ;;",
-         "",
-         {.step = RunStep::TRANSFER, .exit_code = 23, .attempt = 1}},
-    };
+         {.step = COMMAND, .seen = "remote_path refused: character special to the shell"}},
+        {{}, "", "[ $kind != dry ] || exit 10", "", {.step = DRY_RUN, .exit_code = 10, .attempt = 1}},
+        {tried_twice, "", at_run + "11", "", {.step = TRANSFER, .exit_code = 11, .attempt = 2}},
+        {tried_twice, "", at_run + "23", "", {.step = TRANSFER, .exit_code = 23, .attempt = 1}}};
     for (const Case &one : cases) {
         SetUp();
-        const Fake rsync("/usr/sbin/rsync", rsync_script(one.rsync));
-        const Fake ssh("/usr/sbin/ssh", one.ssh + '\n');
-        Keys keys = {{"retry", "0"}};
-        for (const auto &[key, value] : one.keys)
-            keys[key] = value;
-        add_job(keys);
+        const Fake rsync(RSYNC, KIND_OF_CALL + one.rsync + "\n");
+        const Fake ssh(SSH, one.ssh + '\n');
+        add_job(one.keys);
         shell(one.prepared_by);
         const RunReport report = run_job("daily", false);
         EXPECT_FALSE(report.reason) << report.reason.seen;
         ASSERT_EQ(report.folders.size(), 1U) << one.reason.seen;
         const Reason &reason = report.folders[0].reason;
         EXPECT_EQ(reason.step, one.reason.step) << one.reason.seen << " / " << reason.seen;
-        EXPECT_NE(reason.seen.find(one.reason.seen), std::string::npos) << reason.seen;
+        EXPECT_TRUE(has(reason.seen, one.reason.seen));
         EXPECT_EQ(reason.code, one.reason.code) << reason.seen;
         EXPECT_EQ(reason.exit_code, one.reason.exit_code) << reason.seen;
         EXPECT_EQ(reason.attempt, one.reason.attempt) << reason.seen;
@@ -136,19 +92,18 @@ TEST_F(Reasons, TellWhichStepFailedAndWhatWasSeen)
 
 TEST_F(Reasons, AreOfTheirFolderAndOfTheRunItself)
 {
-    const Fake rsync("/usr/sbin/rsync", "exit 0\n");
+    const Fake rsync(RSYNC, "exit 0\n");
     EXPECT_EQ(run_job("daily", false).reason.step, RunStep::START) << "no such job";
-    add_job({{"local_path", std::string(FOLDER) + ":/mnt/HD/HD_a2/None"}});
+    add_job({{"local_path", SHARE + ":/mnt/HD/HD_a2/None"}});
     const RunReport report = run_job("daily", false);
     ASSERT_EQ(report.folders.size(), 2U);
     EXPECT_FALSE(report.folders[0].reason);
     EXPECT_EQ(report.folders[0].attempts, 1);
     EXPECT_EQ(report.folders[1].reason.folder, "/mnt/HD/HD_a2/None");
     EXPECT_FALSE(report.all_done());
-    EXPECT_NE(bakjob_program("-d -r daily").output.find("ERROR: local_path refused: no share holds ["),
-              std::string::npos);
-    write_file("/var/run/bakjob_daily.pid", "1\n");
-    EXPECT_NE(run_job("daily", false).reason.seen.find("is running"), std::string::npos);
+    EXPECT_TRUE(has(bakjob_program("-d -r daily").output, "ERROR: local_path refused: no share holds ["));
+    write_file(PID_FILE, "1\n");
+    EXPECT_TRUE(has(run_job("daily", false).reason.seen, "is running"));
 }
 
 TEST_F(Reasons, ThePlanSaysWhatWillBeDone)

@@ -104,32 +104,27 @@ TEST_F(Remote, DaemonProbesAreExact)
 
 TEST_F(Remote, SshCommandsFollowLoginAndAddress)
 {
-    struct Case {
-        SshLogin login;
-        const char *password;
-        const char *ip;
-        std::string command;
-    };
     const auto client = SshLogin::as_client;
     const auto user = SshLogin::as_user;
-    const std::vector<Case> cases = {
-        {client, "", "10.0.0.1", "/usr/sbin/ssh  10.0.0.1 ls /"},
-        {client, "", "fe80::1", "/usr/sbin/ssh  -6 fe80::1%egiga0 ls /"},
-        {client, "", "::1", "/usr/sbin/ssh  -6 ::1 ls /"},
-        {client, "cHc=", "10.0.0.1", "/usr/sbin/ssh -d 'cHc=' 10.0.0.1 ls /"},
-        {client, "cHc=", "fe80::1", "/usr/sbin/ssh -d 'cHc=' -6 fe80::1%egiga0 ls /"},
-        {client, "cHc=", "::1", "/usr/sbin/ssh -d 'cHc=' -6 ::1 ls /"},
-        {user, "", "10.0.0.1", "/usr/sbin/ssh me@10.0.0.1 ls /"},
-        {user, "", "fe80::1", "/usr/sbin/ssh -6 me@fe80::1%egiga0 ls /"},
-        {user, "", "::1", "/usr/sbin/ssh -6 me@::1 ls /"},
-        {user, "cHc=", "10.0.0.1", "/usr/sbin/ssh -d 'cHc=' me@10.0.0.1 ls /"},
-        {user, "cHc=", "fe80::1", "/usr/sbin/ssh -6 -d 'cHc=' me@fe80::1%egiga0 ls /"},
-        {user, "cHc=", "::1", "/usr/sbin/ssh -6 -d 'cHc=' me@::1 ls /"},
+    struct Case {
+        const char *ip;
+        std::string of_client; // with "PW" where the password stands, if there is one
+        std::string of_user;
+    };
+    const std::vector<Case> cases = {{"10.0.0.1", "PW 10.0.0.1", "PWme@10.0.0.1"},
+                                     {"fe80::1", "PW -6 fe80::1%egiga0", "-6 PWme@fe80::1%egiga0"},
+                                     {"::1", "PW -6 ::1", "-6 PWme@::1"}};
+    const auto with_password = [](std::string words, const std::string &password) {
+        return "/usr/sbin/ssh " + words.replace(words.find("PW"), 2, password) + " ls /";
     };
     for (const Case &one : cases) {
-        copy_text(CurrentJob.ssh_pwd, one.password);
         copy_text(CurrentJob.remote_ip, one.ip);
-        EXPECT_EQ(ssh_command(CurrentJob, one.login, "ls /"), one.command);
+        copy_text(CurrentJob.ssh_pwd, "");
+        EXPECT_EQ(ssh_command(CurrentJob, client, "ls /"), with_password(one.of_client, ""));
+        EXPECT_EQ(ssh_command(CurrentJob, user, "ls /"), with_password(one.of_user, ""));
+        copy_text(CurrentJob.ssh_pwd, "cHc=");
+        EXPECT_EQ(ssh_command(CurrentJob, client, "ls /"), with_password(one.of_client, "-d 'cHc='"));
+        EXPECT_EQ(ssh_command(CurrentJob, user, "ls /"), with_password(one.of_user, "-d 'cHc=' "));
     }
     CurrentJob.pwd_encoded = 0;
     copy_text(CurrentJob.ssh_pwd, "plain");
@@ -151,25 +146,24 @@ TEST_F(Remote, SshTestRepairsAChangedHostKeyOnce)
     struct Case {
         std::string replies;
         SshTestResult result;
-        int logins;
-        int resets;
+        int logins; // after a changed key one more, when the old one is taken away
     };
     const std::vector<Case> cases = {
-        {"bin\netc\n", SSH_OK, 1, 0},
-        {"", SSH_FAILED, 1, 0},
-        {"\nlater\n", SSH_FAILED, 1, 0},
-        {"ssh: No route to host\n", SSH_NO_ROUTE, 1, 0},
-        {"ssh: Connection refused\n", SSH_REFUSED, 1, 0},
-        {"me: Permission denied " + changed, SSH_DENIED, 1, 0},
-        {"ssh: Connection timed out\n", SSH_TIMED_OUT, 1, 0},
-        {std::string(27, '@') + "\n", SSH_OK, 1, 0},
-        {changed + "--\nbin\n", SSH_OK, 2, 1},
-        {changed + "--\n" + changed, SSH_FAILED, 2, 1},
-        {changed + "--\nConnection timed out\n", SSH_TIMED_OUT, 2, 1},
-        {changed + "--\nPermission denied\n", SSH_DENIED, 2, 1},
-        {changed + "--\n", SSH_FAILED, 2, 1},
+        {"bin\netc\n", SSH_OK, 1},
+        {"", SSH_FAILED, 1},
+        {"\nlater\n", SSH_FAILED, 1},
+        {"ssh: No route to host\n", SSH_NO_ROUTE, 1},
+        {"ssh: Connection refused\n", SSH_REFUSED, 1},
+        {"me: Permission denied " + changed, SSH_DENIED, 1},
+        {"ssh: Connection timed out\n", SSH_TIMED_OUT, 1},
+        {std::string(27, '@') + "\n", SSH_OK, 1},
+        {changed + "--\nbin\n", SSH_OK, 2},
+        {changed + "--\n" + changed, SSH_FAILED, 2},
+        {changed + "--\nConnection timed out\n", SSH_TIMED_OUT, 2},
+        {changed + "--\nPermission denied\n", SSH_DENIED, 2},
+        {changed + "--\n", SSH_FAILED, 2},
     };
-    const Fake ssh("/usr/sbin/ssh", REPLYING);
+    const Fake ssh(SSH, REPLYING);
     const Fake keygen("/usr/sbin/ssh-keygen", "echo \"$@\" >>/tmp/resets\n");
     copy_text(CurrentJob.remote_ip, "fe80::1");
     for (const Case &one : cases) {
@@ -179,7 +173,7 @@ TEST_F(Remote, SshTestRepairsAChangedHostKeyOnce)
         EXPECT_EQ(ssh_test(), one.result) << one.replies;
         EXPECT_EQ(lines_of(read_file("/tmp/calls")).size(), static_cast<std::size_t>(one.logins))
             << one.replies;
-        EXPECT_EQ(read_file("/tmp/resets"), one.resets == 0 ? "" : "-R fe80::1%egiga0\n");
+        EXPECT_EQ(read_file("/tmp/resets"), one.logins == 1 ? "" : "-R fe80::1%egiga0\n");
     }
     unlink("/tmp/calls");
     CurrentJob.server_type = 3;
@@ -189,19 +183,14 @@ TEST_F(Remote, SshTestRepairsAChangedHostKeyOnce)
 
 TEST_F(Remote, DaemonConfigurationIsReadByItsLayout)
 {
-    const std::map<std::string, std::string> headers = {{"[ backup ]", "backup"},
-                                                        {"[ my photos ]", "my photos"},
-                                                        {"[ a ] b ]", "a ] b"},
-                                                        {"[backup]", "acku"},
-                                                        {"[ path = x ]", "(none)"},
-                                                        {"no brackets", "(none)"},
-                                                        {"]", "(none)"},
-                                                        {"[]", "(none)"},
-                                                        {"[ ]", "(none)"},
-                                                        {"[  ]", ""},
-                                                        {"x]", "(none)"}};
-    for (const auto &[line, name] : headers)
-        EXPECT_EQ(section_name(line).value_or("(none)"), name) << line;
+    for (const auto &[line, name] : Keys{{"[ backup ]", "backup"},
+                                         {"[ my photos ]", "my photos"},
+                                         {"[ a ] b ]", "a ] b"},
+                                         {"[backup]", "acku"},
+                                         {"[  ]", ""}})
+        EXPECT_EQ(section_name(line), name) << line;
+    for (const char *line : {"[ path = x ]", "no brackets", "]", "[]", "[ ]", "x]"})
+        EXPECT_FALSE(section_name(line)) << line;
     EXPECT_EQ(path_of_line("path = /mnt/HD/x"), "/mnt/HD/x");
     EXPECT_EQ(path_of_line("  path = /x"), "= /x") << "path lines begin at the first column";
     EXPECT_FALSE(path_of_line("paths=/x"));
@@ -230,33 +219,42 @@ TEST_F(Remote, AMissingFolderIsMadeBelowTheModulesOwn)
         {"[ backup ]\npath = /m\n", "-rf", "x", ""},
         {"[ backup ]\npath = /m\n", "s", std::string(1100, 'x'), ""},
     };
-    const Fake ssh("/usr/sbin/ssh",
-                   "for last; do :; done\ncase $* in\n*'cat /etc/rsyncd.conf') cat /tmp/config ;;\n"
-                   "*) printf '%s' \"$last\" >/tmp/command; exit 7 ;;\nesac\n");
-    for (const Case &one : cases) {
-        write_file("/tmp/config", one.config);
-        write_file("/tmp/remote_rshareinfo_it's.txt", "old");
-        unlink("/tmp/command");
-        EXPECT_EQ(rsync_prepare_remote_dir(named("it's"), "backup", one.first, one.second),
-                  one.remote_command.empty() ? -1 : 7 << 8);
-        EXPECT_EQ(read_file("/tmp/command"), one.remote_command);
-        EXPECT_FALSE(exists("/tmp/remote_rshareinfo_it's.txt"));
+    // Every case has a remote side of its own, as each waits a second.
+    const Fake ssh(SSH,
+                   "for last; do :; done\nip=$(echo \"$*\" | grep -o '10[.]0[.]0[.][0-9]*')\ncase $* in\n"
+                   "*'cat /etc/rsyncd.conf') cat /tmp/config.$ip ;;\n"
+                   "*) printf '%s' \"$last\" >/tmp/command.$ip; exit 7 ;;\nesac\n");
+    std::vector<pid_t> all;
+    for (std::size_t i = 0; i < cases.size(); ++i) {
+        const std::string ip = "10.0.0." + std::to_string(i);
+        const std::string name = "it's " + std::to_string(i);
+        write_file("/tmp/config." + ip, cases[i].config);
+        write_file("/tmp/remote_rshareinfo_" + name + ".txt", "old");
+        all.push_back(fork());
+        if (all.back() != 0) continue;
+        copy_text(CurrentJob.remote_ip, ip);
+        _exit(exit_code(rsync_prepare_remote_dir(named(name), "backup", cases[i].first, cases[i].second)));
+    }
+    for (std::size_t i = 0; i < cases.size(); ++i) {
+        EXPECT_EQ(wait_for(all[i]), cases[i].remote_command.empty() ? 255 : 7) << i;
+        EXPECT_EQ(read_file("/tmp/command.10.0.0." + std::to_string(i)), cases[i].remote_command);
+        EXPECT_FALSE(exists("/tmp/remote_rshareinfo_it's " + std::to_string(i) + ".txt"));
     }
     EXPECT_FALSE(exists("/tmp/pwned"));
 }
 
 TEST_F(Remote, AConfigurationWithoutEndFillsNoDisk)
 {
-    const Fake ssh("/usr/sbin/ssh", "exec 3>&1\n(yes | head -c 9000000) >&3\n"
-                                    "stat --format=%s /tmp/remote_r*.txt >>/tmp/size\n");
+    const Fake ssh(SSH, "exec 3>&1\n(yes | head -c 9000000) >&3\n"
+                        "stat --format=%s /tmp/remote_r*.txt >>/tmp/size\n");
     std::signal(SIGXFSZ, SIG_IGN);
     run_options.debug_mode = 1;
-    testing::internal::CaptureStdout();
-    EXPECT_FALSE(rsync_find_module_folder(named("daily"), "backup"));
-    CurrentJob.server_type = SERVER_SAME_KIND;
-    rsync_discover_remote();
-    const std::string trace = testing::internal::GetCapturedStdout();
-    EXPECT_NE(trace.find("ERROR: [/tmp/remote_rshareinfo_daily.txt] refused"), std::string::npos) << trace;
+    EXPECT_TRUE(has(printed_by([] {
+                        EXPECT_FALSE(rsync_find_module_folder(named("daily"), "backup"));
+                        CurrentJob.server_type = SERVER_SAME_KIND;
+                        rsync_discover_remote();
+                    }),
+                    "ERROR: [/tmp/remote_rshareinfo_daily.txt] refused"));
     const auto sizes = lines_of(read_file("/tmp/size"));
     ASSERT_EQ(sizes.size(), 2U);
     for (const std::string &size : sizes)
@@ -268,7 +266,7 @@ TEST_F(Remote, AConfigurationWithoutEndFillsNoDisk)
 
 TEST_F(Remote, ALongLogTakesTheMessagesOfTheFetch)
 {
-    const Fake ssh("/usr/sbin/ssh", "echo warning >&2 || exit; printf '[ backup ]\npath = /m\n'\n");
+    const Fake ssh(SSH, "echo warning >&2 || exit; printf '[ backup ]\npath = /m\n'\n");
     write_file("/tmp/log", std::string(3'000'000, 'x'));
     EXPECT_EQ(in_child([] {
                   dup2(open("/tmp/log", O_WRONLY | O_APPEND), STDERR_FILENO);

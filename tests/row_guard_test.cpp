@@ -9,22 +9,12 @@ namespace fs = std::filesystem;
 namespace
 {
 
-constexpr const char *FOLDER = "/mnt/HD/HD_a2/Public";
-
-// Notes what it is called for: list and write (the probes), dry and run; and does what /tmp/at_KIND says.
-constexpr const char *RSYNC = "case $* in\n*--job-name=*--dry-run*) kind=dry ;;\n*--job-name=*) kind=run ;;\n"
-                              "*--dry-run*) kind=write ;;\n*) kind=list ;;\nesac\n"
-                              "echo $kind >>/tmp/calls\n"
-                              "[ ! -e /tmp/at_$kind ] || . /tmp/at_$kind\nexit 0\n";
-
-class RowGuard : public Appliance
+class RowGuard : public ApplianceWithShare
 {
 protected:
     void SetUp() override
     {
-        Appliance::SetUp();
-        add_share("Public", FOLDER);
-        write_file("/tmp/kv_serial.txt", "S1");
+        ApplianceWithShare::SetUp();
         write_file("/tmp/victim/daily.0/kept", "kept");
         shell("touch --date=@1000 /tmp/victim /tmp/victim/daily.0");
     }
@@ -34,7 +24,7 @@ protected:
         SetUp();
         add_job(keys);
         for (const int number : {0, 1})
-            write_file(FOLDER + std::string("/daily.") + std::to_string(number) + "/file", "x");
+            write_file(SHARE + "/daily." + std::to_string(number) + "/file", "x");
     }
 
     static std::string calls() { return shell("cat /tmp/calls 2>/dev/null | tr '\\n' ' '").output; }
@@ -45,7 +35,9 @@ protected:
     }
 
     static inline const Keys PULL{{"backup_type", "2"}, {"inc_enable", "1"}};
-    Fake rsync_{"/usr/sbin/rsync", RSYNC};
+    // Notes what it is called for, and does what /tmp/at_KIND says.
+    Fake rsync_{RSYNC, KIND_OF_CALL +
+                           "echo $kind >>/tmp/calls\n[ ! -e /tmp/at_$kind ] || . /tmp/at_$kind\nexit 0\n"};
 };
 
 TEST_F(RowGuard, LinksAndFilesInTheRowAreRefusedBeforeAnythingIsAsked)
@@ -67,13 +59,12 @@ TEST_F(RowGuard, LinksAndFilesInTheRowAreRefusedBeforeAnythingIsAsked)
     for (const Case &c : cases) {
         for (const std::string &kind : kinds) {
             set_up_with(c.keys);
-            const std::string path = FOLDER + std::string("/") + c.name;
+            const std::string path = SHARE + "/" + c.name;
             fs::remove_all(path);
             ASSERT_EQ(shell(kind + path).status, 0);
             const std::string before = victim();
             const Ran ran = bakjob_program("-d " + c.arguments);
-            EXPECT_NE(ran.output.find("ERROR: local_path refused: [" + path + "] is "), std::string::npos)
-                << ran.output;
+            EXPECT_TRUE(has(ran.output, "ERROR: local_path refused: [" + path + "] is "));
             EXPECT_EQ(calls(), "") << c.arguments << kind;
             EXPECT_EQ(job_key(1, c.state == "4" && c.arguments[1] == 'i' ? "rstate" : "state"), c.state);
             EXPECT_EQ(alerts().size(), 1U);
@@ -82,7 +73,7 @@ TEST_F(RowGuard, LinksAndFilesInTheRowAreRefusedBeforeAnythingIsAsked)
         }
     }
     set_up_with(PULL);
-    fs::create_directory_symlink("/tmp/victim/daily.0", std::string(FOLDER) + "/daily.3");
+    fs::create_directory_symlink("/tmp/victim/daily.0", SHARE + "/daily.3");
     bakjob_program("-r daily");
     EXPECT_EQ(job_key(1, "state"), "2") << "outside of the row of three";
     set_up_with(PULL);
@@ -100,7 +91,7 @@ TEST_F(RowGuard, WhatIsPutThereInTheMiddleIsMetByNoFurtherCommand)
         std::string calls;
         Keys keys;
     };
-    const std::string row = FOLDER + std::string("/daily.");
+    const std::string row = SHARE + "/daily.";
     const std::string all = "list write dry run ";
     const std::vector<Case> cases = {
         {"write", row + "0", "-r daily", "4", "list write ", PULL},
@@ -109,8 +100,8 @@ TEST_F(RowGuard, WhatIsPutThereInTheMiddleIsMetByNoFurtherCommand)
         {"run", row + "0", "-r daily", "4", all, PULL},
         {"write", row + "1", "-n 2 -r daily", "9", "write ", PULL},
         {"dry", row + "1", "-n 2 -r daily", "9", "write dry ", PULL},
-        {"dry", FOLDER + std::string("/sub"), "-r daily", "4", "list write dry ", {}},
-        {"dry", FOLDER + std::string("/sub"), "-r daily", "4", "list write dry ", {{"backup_type", "2"}}},
+        {"dry", SHARE + "/sub", "-r daily", "4", "list write dry ", {}},
+        {"dry", SHARE + "/sub", "-r daily", "4", "list write dry ", {{"backup_type", "2"}}},
     };
     for (const Case &c : cases) {
         Keys keys = c.keys;
@@ -118,12 +109,11 @@ TEST_F(RowGuard, WhatIsPutThereInTheMiddleIsMetByNoFurtherCommand)
         if (sub) keys["local_path"] = c.path;
         keys["retry"] = "3"; // a refusal is not tried again
         set_up_with(keys);
-        fs::create_directories(FOLDER + std::string("/sub"));
+        fs::create_directories(SHARE + "/sub");
         write_file("/tmp/at_" + c.when, "rm -rf " + c.path + "; ln -s /tmp/victim/daily.0 " + c.path + "\n");
         const std::string before = victim();
         const Ran ran = bakjob_program("-d " + c.arguments);
-        EXPECT_NE(ran.output.find("ERROR: local_path refused: [" + c.path + "] is a link"), std::string::npos)
-            << ran.output;
+        EXPECT_TRUE(has(ran.output, "ERROR: local_path refused: [" + c.path + "] is a link"));
         EXPECT_EQ(calls(), c.calls) << c.when << c.path;
         EXPECT_EQ(job_key(1, "state"), c.state) << c.when << c.path;
         EXPECT_EQ(victim(), before) << "not even its time";
@@ -133,29 +123,25 @@ TEST_F(RowGuard, WhatIsPutThereInTheMiddleIsMetByNoFurtherCommand)
 TEST_F(RowGuard, ACheckKnowsAMountThatIsSafe)
 {
     add_job({{"backup_type", "2"}});
-    for (const auto &[options, noted] :
-         std::map<std::string, bool>{{"nosuid", true}, {"nodev", true}, {"nosuid,nodev", false}}) {
-        shell("mount -t tmpfs -o " + options + " share " + FOLDER);
+    for (const std::string options : {"nosuid", "nodev", "nosuid,nodev"}) {
+        shell("mount -t tmpfs -o " + options + " share " + SHARE);
         const std::string found = shell("/usr/sbin/bakjobctl check daily").output;
-        EXPECT_EQ(found.find("setuid") != std::string::npos, noted) << options << found;
-        shell(std::string("umount ") + FOLDER);
+        EXPECT_EQ(found.find("setuid") != std::string::npos, options != "nosuid,nodev") << options << found;
+        shell("umount " + SHARE);
     }
 }
 
 TEST_F(RowGuard, NoStepOfTheRotationGoesThroughALink)
 {
-    // Planted by the step before, with the program's own result.
-    for (const auto &[program, path] :
-         std::map<std::string, std::string>{{"rm", "/daily.1"}, {"mv", "/daily.1"}}) {
+    for (const std::string program : {"rm", "mv"}) {
         set_up_with(PULL);
-        fs::create_directories(FOLDER + std::string("/daily.2"));
-        const std::string front = "/usr/local/bin/" + program;
-        write_file(front, "#!/bin/sh\n/bin/" + program + " \"$@\"\n/bin/rm -rf " + FOLDER + path +
-                              "; ln -s /tmp/victim " + FOLDER + path + "\n");
-        fs::permissions(front, fs::perms(0755));
+        fs::create_directories(SHARE + "/daily.2");
+        // Planted by the step before, with the program's own result.
+        const Fake planting("/usr/local/bin/" + program, "/bin/" + program + " \"$@\"\n/bin/rm -rf " + SHARE +
+                                                             "/daily.1; ln -s /tmp/victim " + SHARE +
+                                                             "/daily.1\n");
         const std::string before = victim();
         bakjob_program("-r daily");
-        fs::remove(front);
         EXPECT_EQ(victim(), before) << program;
         EXPECT_EQ(calls(), "list write ") << program;
         EXPECT_EQ(job_key(1, "state"), "4") << program;

@@ -25,11 +25,6 @@ std::string build(RsyncJob job)
     return rsync_build_command(job).value_or("(refused)");
 }
 
-bool has(const std::string &text, const std::string &part)
-{
-    return text.find(part) != std::string::npos;
-}
-
 } // namespace
 
 class Command : public Appliance

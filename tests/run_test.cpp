@@ -18,30 +18,24 @@ namespace fs = std::filesystem;
 namespace
 {
 
-// Four kinds of call: list (the daemon test), write (the write test), dry and run. The n-th call of a kind
-// prints line n of /tmp/KIND.reply and ends with line n of /tmp/KIND.code, or 0.
-constexpr const char *FAKE_RSYNC = "case $* in\n"
-                                   "*--job-name=*--dry-run*) kind=dry ;;\n*--job-name=*) kind=run "
-                                   ";;\n*--dry-run*) kind=write ;;\n*) kind=list ;;\nesac\n"
-                                   "echo $kind >>/tmp/calls; echo \"$*\" >>/tmp/arguments\n"
-                                   "n=$(grep -c $kind /tmp/calls)\n"
-                                   "sed -n ${n}p /tmp/$kind.reply 2>/dev/null\n"
-                                   "code=$(sed -n ${n}p /tmp/$kind.code 2>/dev/null)\n"
-                                   "[ \"$code\" = KILL ] && kill -9 $$\n"
-                                   "exit ${code:-0}\n";
+// The n-th call of a kind prints line n of /tmp/KIND.reply and ends with line n of /tmp/KIND.code, or 0.
+const std::string FAKE_RSYNC = KIND_OF_CALL + "echo $kind >>/tmp/calls; echo \"$*\" >>/tmp/arguments\n"
+                                              "n=$(grep -c $kind /tmp/calls)\n"
+                                              "sed -n ${n}p /tmp/$kind.reply 2>/dev/null\n"
+                                              "code=$(sed -n ${n}p /tmp/$kind.code 2>/dev/null)\n"
+                                              "[ \"$code\" = KILL ] && kill -9 $$\n"
+                                              "exit ${code:-0}\n";
 
 } // namespace
 
-class Run : public Appliance
+class Run : public ApplianceWithShare
 {
 protected:
     void SetUp() override
     {
-        Appliance::SetUp();
-        add_share("Public", FOLDER);
+        ApplianceWithShare::SetUp();
         store_set("/system_mgr/samba/netbios_name", "NAS");
         store_save();
-        write_file("/tmp/kv_serial.txt", "S1");
     }
 
     static void expect_calls(const std::string &calls, const std::string &about = "")
@@ -54,14 +48,13 @@ protected:
     // One folder's transfer, as far as the module is called.
     static BackupResult back_up(RsyncJob job)
     {
-        copy_text(job.local_path, FOLDER);
+        copy_text(job.local_path, SHARE);
         for (const char *file : {"/tmp/calls", "/tmp/arguments"})
             unlink(file);
         return rsync_run_backup(named("daily"), job);
     }
 
-    static constexpr const char *FOLDER = "/mnt/HD/HD_a2/Public";
-    Fake rsync_{"/usr/sbin/rsync", FAKE_RSYNC};
+    Fake rsync_{RSYNC, FAKE_RSYNC};
 };
 
 TEST_F(Run, RetriesAreCounted)
@@ -156,134 +149,87 @@ TEST_F(Run, ProbesDecideWhetherATransferStarts)
 
 TEST_F(Run, RefusedJobsRunNoTransfer)
 {
+    struct Case {
+        std::function<void(RsyncJob &)> change;
+        BackupResult result;
+        std::string calls;
+    };
+    const std::string no_file = "/no/such/folder/file";
+    const Fake ssh(SSH, "echo 'Permission denied'\n");
     add_job({});
+    for (const Case &one : std::vector<Case>{
+             {[](RsyncJob &job) { job.server_type = 3; }, BACKUP_FAILED, ""},
+             {[](RsyncJob &job) { copy_text(job.remote_ip, "1;reboot"); }, BACKUP_REMOTE_FAILED, ""},
+             {[](RsyncJob &job) { copy_text(job.remote_path, "m/\"x"); }, BACKUP_FAILED, "list "},
+             {[&](RsyncJob &job) { copy_text(job.rsync_pwd_file, no_file); }, BACKUP_FAILED, ""},
+             {[](RsyncJob &job) { job.use_ssh = 1; }, BACKUP_SSH_FAILED, ""}}) {
+        RsyncJob job = make_job("daily");
+        one.change(job);
+        EXPECT_EQ(back_up(job), one.result);
+        expect_calls(one.calls);
+    }
+    EXPECT_EQ(job_key(1, "state"), "0");
     RsyncJob job = make_job("daily");
-    job.server_type = 3;
-    EXPECT_EQ(back_up(job), BACKUP_FAILED);
-    expect_calls("");
-    job = make_job("daily");
-    copy_text(job.remote_ip, "1;reboot");
-    EXPECT_EQ(back_up(job), BACKUP_REMOTE_FAILED);
-    expect_calls("");
-    job = make_job("daily");
-    copy_text(job.remote_path, "m/\"x");
-    EXPECT_EQ(back_up(job), BACKUP_FAILED);
-    expect_calls("list ");
-    job = make_job("daily");
-    copy_text(job.rsync_pwd_file, "/no/such/folder/file");
-    EXPECT_EQ(back_up(job), BACKUP_FAILED);
+    copy_text(job.rsync_pwd_file, no_file);
     job.rsync_mode = 1;
     EXPECT_EQ(back_up(job), BACKUP_DONE) << "a remote shell needs no password file";
-    job = make_job("daily");
-    job.use_ssh = 1;
-    const Fake ssh("/usr/sbin/ssh", "echo 'Permission denied'\n");
-    EXPECT_EQ(back_up(job), BACKUP_SSH_FAILED);
-    expect_calls("");
-    EXPECT_EQ(job_key(1, "state"), "3") << "of the one transfer above";
-}
-
-TEST_F(Run, ThePasswordFileHoldsWhatTheServerTakes)
-{
-    struct Case {
-        int pwd_encoded;
-        int server_type;
-        std::string password;
-        std::string content;
-    };
-    const std::vector<Case> cases = {{0, 2, "secret", "secret\n"},
-                                     {0, 1, "secret", "c2VjcmV0\n"},
-                                     {1, 2, "c2VjcmV0", "secret\n"},
-                                     {1, 1, "c2VjcmV0", "c2VjcmV0\n"},
-                                     {0, 2, std::string(127, 'p'), std::string(127, 'p') + "\n"},
-                                     {0, 1, std::string(94, 'p'), ""},
-                                     {1, 2, "!", ""}};
-    write_file("/tmp/victim", "kept");
-    for (const Case &one : cases) {
-        CurrentJob = make_job("it's $x");
-        CurrentJob.pwd_encoded = one.pwd_encoded;
-        CurrentJob.server_type = one.server_type;
-        copy_text(CurrentJob.rsync_pwd, one.password);
-        fs::remove("/tmp/r_it's $x.passwd");
-        fs::create_symlink("/tmp/victim", "/tmp/r_it's $x.passwd");
-        EXPECT_EQ(rsync_write_password_file(), !one.content.empty());
-        if (one.content.empty()) continue;
-        EXPECT_EQ(read_file("/tmp/r_it's $x.passwd"), one.content);
-        EXPECT_EQ(octal_mode("/tmp/r_it's $x.passwd"), "600");
-    }
-    EXPECT_EQ(read_file("/tmp/victim"), "kept");
 }
 
 TEST_F(Run, EachFolderRaisesItsAlertAndTheJobItsState)
 {
-    const std::string places = std::string(FOLDER) + "/a:" + FOLDER + "/no:/elsewhere:" + FOLDER + "/b c";
+    const std::string places = SHARE + "/a:" + SHARE + "/no:/elsewhere:" + SHARE + "/b c";
     add_job({{"local_path", places}});
     for (const char *folder : {"a", "b c"})
-        fs::create_directories(std::string(FOLDER) + "/" + folder);
+        fs::create_directories(SHARE + "/" + folder);
     write_file("/tmp/run.code", "0\n11\n0\n");
     EXPECT_EQ(bakjob_program("-r daily").status, 0);
     const std::string remote = "daily,NAS,backup/S1_remote_backup/daily/Public/";
     EXPECT_EQ(alerts(), (std::vector<std::string>{"1 2402 " + remote + "a", "1 1400 " + remote + "no",
                                                   "1 1400 daily,NAS,backup", "1 2402 " + remote + "b c"}));
     EXPECT_EQ(job_key(1, "state"), "4");
-    EXPECT_EQ(read_file("/tmp/rsync_bakcup_src_folder_name.daily"), std::string(FOLDER) + "/b c\n4/4\n");
-    EXPECT_FALSE(exists("/var/run/bakjob_daily.pid"));
-    EXPECT_NE(read_file("/tmp/arguments").find("bk@127.0.0.1::backup/S1_remote_backup/daily/Public/b c"),
-              std::string::npos);
+    EXPECT_EQ(read_file("/tmp/rsync_bakcup_src_folder_name.daily"), SHARE + "/b c\n4/4\n");
+    EXPECT_FALSE(exists(PID_FILE));
+    EXPECT_TRUE(has(read_file("/tmp/arguments"), "bk@127.0.0.1::backup/S1_remote_backup/daily/Public/b c"));
 }
 
 TEST_F(Run, TheFinalStateFollowsKindAndSchedule)
 {
     const std::string many = "/mnt/HD/HD_a2/Public:/1:/2:/3:/4:/5:/6:/7:/8:/9:/10:/11";
     struct Case {
-        Keys keys;
-        std::string run_code;
         std::string arguments;
-        std::string state;
-        std::string rstate;
+        bool done;
+        Keys keys;
+        std::string states; // of backup and restore
         std::string last_alert;
     };
     const std::string name = "daily,NAS,";
-    const std::string remote = "backup/S1_remote_backup/daily/Public";
+    const std::string remote = name + "backup/S1_remote_backup/daily/Public";
+    const std::string cut = name + std::string(500, 'x');
+    const Keys scheduled{{"schedule_mode", "3"}};
+    const Keys snapshots{{"backup_type", "2"}, {"inc_enable", "1"}};
     const std::vector<Case> cases = {
-        {{}, "", "-r daily", "2", "0", "1 2402 " + name + remote},
-        {{{"schedule_mode", "3"}}, "", "-r daily", "1", "0", "1 2402 " + name + remote},
-        {{{"schedule_mode", "3"}}, "11", "-r daily", "4", "0", "1 1400 " + name + remote},
-        {{{"local_path", ""}}, "", "-r daily", "2", "0", ""},
-        {{{"backup_type", "2"}}, "", "-r daily", "2", "0", "1 2402 " + name + "Public"},
-        {{}, "", "-i x -r daily", "0", "2", "1 2403 " + name + "Public"},
-        {{}, "11", "-i x -r daily", "0", "4", "1 1401 " + name + "Public"},
-        {{{"local_path", "/short"}, {"backup_type", "2"}}, "", "-r daily", "4", "0", "1 1400 " + name},
-        {{{"local_path", "/mnt/HD/HD_a2/Gone"}}, "", "-i x -r daily", "0", "4", "1 1401 " + name + "Gone"},
-        {{{"local_path", many}}, "", "-r daily", "4", "0", "1 1400 " + name + "backup"},
-        {{{"backup_type", "2"}, {"inc_enable", "1"}},
-         "",
-         "-n 1 -r daily",
-         "2",
-         "0",
-         "1 2402 " + name + "Public"},
-        {{{"backup_type", "2"}, {"inc_enable", "1"}},
-         "11",
-         "-n 1 -r daily",
-         "9",
-         "0",
-         "1 1400 " + name + "Public"},
-        {{{"remote_path", std::string(1000, 'x')}},
-         "",
-         "-r daily",
-         "4",
-         "0",
-         "1 1400 " + name + std::string(500, 'x').substr(0, 511 - name.size())},
-    };
+        {"-r daily", true, {}, "2 0", "1 2402 " + remote},
+        {"-r daily", true, scheduled, "1 0", "1 2402 " + remote},
+        {"-r daily", false, scheduled, "4 0", "1 1400 " + remote},
+        {"-r daily", true, {{"local_path", ""}}, "2 0", ""},
+        {"-r daily", true, {{"backup_type", "2"}}, "2 0", "1 2402 " + name + "Public"},
+        {"-i x -r daily", true, {}, "0 2", "1 2403 " + name + "Public"},
+        {"-i x -r daily", false, {}, "0 4", "1 1401 " + name + "Public"},
+        {"-r daily", true, {{"local_path", "/short"}, {"backup_type", "2"}}, "4 0", "1 1400 " + name},
+        {"-i x -r daily", true, {{"local_path", "/mnt/HD/HD_a2/Gone"}}, "0 4", "1 1401 " + name + "Gone"},
+        {"-r daily", true, {{"local_path", many}}, "4 0", "1 1400 " + name + "backup"},
+        {"-n 1 -r daily", true, snapshots, "2 0", "1 2402 " + name + "Public"},
+        {"-n 1 -r daily", false, snapshots, "9 0", "1 1400 " + name + "Public"},
+        {"-r daily", true, {{"remote_path", std::string(1000, 'x')}}, "4 0", "1 1400 " + cut}};
     for (const Case &one : cases) {
         SetUp();
         add_job(one.keys);
-        fs::create_directories(std::string(FOLDER) + "/daily.0");
-        write_file("/tmp/run.code", one.run_code);
+        fs::create_directories(SHARE + "/daily.0");
+        write_file("/tmp/run.code", one.done ? "" : "11");
         EXPECT_EQ(bakjob_program(one.arguments).status, 0);
-        EXPECT_EQ(job_key(1, "state") + " " + job_key(1, "rstate"), one.state + " " + one.rstate)
+        EXPECT_EQ(job_key(1, "state") + " " + job_key(1, "rstate"), one.states)
             << one.arguments << " " << one.last_alert;
-        EXPECT_EQ(alerts().empty() ? "" : alerts().back().substr(0, 8 + 500),
-                  one.last_alert.substr(0, 8 + 500));
+        EXPECT_EQ(alerts().empty() ? "" : alerts().back().substr(0, 508), one.last_alert.substr(0, 508));
     }
 }
 
@@ -295,42 +241,39 @@ TEST_F(Run, RefusalsChangeNothing)
         int status;
         std::string trace;
     };
-    const std::vector<Case> cases = {
-        {{}, "-d -r other", 255, "ERROR: not found this job_name [other] or disabled\n"},
+    std::vector<Case> cases = {
         {{{"enable", "0"}}, "-d -r daily", 255, "ERROR: not found this job_name [daily] or disabled\n"},
-        {{}, "-d -r ../daily", 255, "ERROR: not found this job_name [../daily] or disabled\n"},
-        {{}, "-d -r ''", 255, "ERROR: not found this job_name [] or disabled\n"},
         {{{"job_name", "a/b"}}, "-d -r a/b", 255, "ERROR: not found this job_name [a/b] or disabled\n"},
         {{{"schedule_mode", "2"}, {"state", "2"}}, "-d -r daily", 255, ""},
         {{{"schedule_mode", "2"}, {"state", "2"}}, "-d -r daily -b", 255, ""},
         {{}, "-d -n 1 -r daily", 255, ""},
         {{{"inc_enable", "1"}, {"backup_type", "2"}}, "-d -n 1 -r daily", 255, ""},
-        {{}, "-d -n 0 -r daily", 255, "ERROR: input error!\n"},
-        {{}, "-d -n 11", 255, "ERROR: input error!\n"},
-        {{}, "-d -n abc", 255, "ERROR: input error!\n"},
-        {{}, "-d -n 4294967297", 255, "ERROR: input error!\n"},
-        {{}, "-d -n -4294967295", 255, "ERROR: input error!\n"},
         {{}, "-d -k a/b", 0, "ERROR: job name refused: [a/b]\n"},
         {{}, "-d -n 10 -n -3", 0, ""},
         {{}, "-d -p cGFrdG8= -p YWJj", 0, "encode_pwd = [pakto]\nencode_pwd = [abcto]\n"},
     };
+    for (const std::string name : {"other", "../daily", ""})
+        cases.push_back(
+            {{}, "-d -r '" + name + "'", 255, "ERROR: not found this job_name [" + name + "] or disabled\n"});
+    for (const std::string number : {"0 -r daily", "11", "abc", "4294967297", "-4294967295"})
+        cases.push_back({{}, "-d -n " + number, 255, "ERROR: input error!\n"});
     for (const Case &one : cases) {
         SetUp();
         add_job(one.keys);
-        const std::string before = read_file("/etc/NAS_CFG/config.xml");
+        const std::string before = read_file(STORE);
         const Ran ran = bakjob_program(one.arguments);
         EXPECT_EQ(ran.status, one.status) << one.arguments;
         EXPECT_EQ(ran.output, "OPEN DEBUG MODE!!\n" + one.trace) << one.arguments;
-        EXPECT_EQ(read_file("/etc/NAS_CFG/config.xml"), before);
+        EXPECT_EQ(read_file(STORE), before);
         expect_calls("");
         EXPECT_TRUE(alerts().empty());
     }
     SetUp();
     add_job({{"schedule_mode", "2"}, {"state", "2"}});
     EXPECT_EQ(bakjob_program("-b -r daily").status, 0);
-    write_file("/var/run/bakjob_daily.pid", "999999\n");
+    write_file(PID_FILE, "999999\n");
     EXPECT_EQ(bakjob_program("-d -r daily").output, "OPEN DEBUG MODE!!\nERROR: rsync backup is running!\n");
-    EXPECT_EQ(read_file("/var/run/bakjob_daily.pid"), "999999\n");
+    EXPECT_EQ(read_file(PID_FILE), "999999\n");
     expect_calls("list write dry run ");
 }
 

@@ -10,18 +10,14 @@ using namespace bakjob;
 class Schedule : public Appliance
 {
 protected:
-    // The group "rsync" stands between two others; its entries run these commands.
+    // The group "rsync" stands between two others.
     static void set_entries(const std::vector<std::string> &commands)
     {
+        store_set("/system_mgr/crond/list/count", "1");
+        store_set("/system_mgr/crond/list/name:1", "first");
+        set_schedule(commands);
         store_set("/system_mgr/crond/list/count", "3");
-        for (const auto &[number, name] : Keys{{"1", "first"}, {"2", "rsync"}, {"3", "last"}}) {
-            store_set("/system_mgr/crond/list/name:" + number, name);
-        }
-        store_set("/system_mgr/crond/rsync/count", std::to_string(commands.size()));
-        int item = 0;
-        for (const std::string &command : commands) {
-            store_set("/system_mgr/crond/rsync/item:" + std::to_string(++item) + "/run", command);
-        }
+        store_set("/system_mgr/crond/list/name:3", "last");
         store_save();
     }
 
@@ -29,9 +25,8 @@ protected:
     {
         std::string all;
         const int count = xml_get_int("/system_mgr/crond/rsync/count");
-        for (int i = 1; i <= count; ++i) {
+        for (int i = 1; i <= count; ++i)
             all += store_get("/system_mgr/crond/rsync/item:" + std::to_string(i) + "/run") + "|";
-        }
         return all;
     }
 
@@ -42,59 +37,46 @@ protected:
                store_get("/system_mgr/crond/list/name:3");
     }
 
-    // "/etc/cron.d/device_scheduler" is written exactly when the scheduler was told.
-    static bool committed() { return exists("/etc/cron.d/device_scheduler"); }
+    // The file is written exactly when the scheduler was told.
+    static bool committed() { return exists(CRON); }
 };
 
 TEST_F(Schedule, PruningKeepsExactlyTheEntriesThatNameAJob)
 {
-    const std::string long_name(127, 'n');
     struct Case {
         std::vector<std::string> jobs;
         std::vector<std::string> commands;
         std::string left;
-        std::string groups;
-        bool committed;
     };
+    const std::string long_name(127, 'n');
     const std::string filler(300, 'x');
-    const std::string all_groups = "3:first,rsync,last";
-    const std::string no_group = "2:first,last,(none)";
+    const std::vector<std::string> long_ones = {std::string(255, 'x'), filler + "'a'", filler + "'b'",
+                                                filler + filler + "'" + filler, "-r 'b'"};
+    const std::string unjudged(1U << 20U, '\'');
     const std::vector<Case> cases = {
-        {{"a", "b"}, {"-r 'a'", "-r 'c'", "-r 'b'"}, "-r 'a'|-r 'b'|", all_groups, true},
-        {{"a"}, {"-r 'x'", "-r 'y'", "-r 'a'", "-r 'z'"}, "-r 'a'|", all_groups, true},
-        {{}, {"-r 'a'", "-r 'c'", "-r 'b'"}, "", no_group, true},
-        {{"a"}, {"-r 'a'"}, "-r 'a'|", all_groups, false},
-        {{"ab"}, {"-r 'abc'", "-r 'ab'"}, "-r 'ab'|", all_groups, true},
-        {{long_name}, {"-r '" + long_name + "'", "-r 'x'"}, "-r '" + long_name + "'|", all_groups, true},
-        {{"a"}, {}, "", all_groups, false},
-        // However long.
-        {{"a"},
-         {std::string(255, 'x'), filler + "'a'", filler + "'b'", filler + filler + "'" + filler, "-r 'b'"},
-         filler + "'a'|",
-         all_groups,
-         true},
-        {{"a"}, {filler + "'b'"}, "", no_group, true}};
+        {{"a", "b"}, {"-r 'a'", "-r 'c'", "-r 'b'"}, "-r 'a'|-r 'b'|"},
+        {{"a"}, {"-r 'x'", "-r 'y'", "-r 'a'", "-r 'z'"}, "-r 'a'|"},
+        {{}, {"-r 'a'", "-r 'c'", "-r 'b'"}, ""},
+        {{"a"}, {"-r 'a'"}, "-r 'a'|"},
+        {{"ab"}, {"-r 'abc'", "-r 'ab'"}, "-r 'ab'|"},
+        {{long_name}, {"-r '" + long_name + "'", "-r 'x'"}, "-r '" + long_name + "'|"},
+        {{"a"}, {}, ""},
+        {{"a"}, long_ones, filler + "'a'|"},
+        {{"a"}, {filler + "'b'"}, ""},
+        {{"a"}, {unjudged, "-r 'b'"}, unjudged.substr(0, 4095) + "|"}};
     for (const Case &one : cases) {
         SetUp();
         set_entries(one.commands);
+        const std::string before = entries();
         rsync_load_jobs();
         for (const std::string &name : one.jobs)
             rsync_list_add_job(make_job(name));
         rsync_save_jobs();
         EXPECT_EQ(entries(), one.left);
-        EXPECT_EQ(groups(), one.groups);
-        EXPECT_EQ(committed(), one.committed) << one.left;
+        EXPECT_EQ(groups(),
+                  one.left.empty() && !before.empty() ? "2:first,last,(none)" : "3:first,rsync,last");
+        EXPECT_EQ(committed(), one.left != before) << one.left;
     }
-}
-
-TEST_F(Schedule, ACommandTooLongToBeJudgedStays)
-{
-    set_entries({std::string(1U << 20U, '\''), "-r 'b'"});
-    rsync_load_jobs();
-    rsync_list_add_job(make_job("a"));
-    rsync_save_jobs();
-    EXPECT_EQ(store_get("/system_mgr/crond/rsync/count"), "1");
-    EXPECT_EQ(store_get("/system_mgr/crond/rsync/item:1/run").substr(0, 3), "'''");
 }
 
 TEST_F(Schedule, RemovingAJobsEntryTakesTheFirstThatHoldsItsName)
@@ -122,20 +104,14 @@ TEST_F(Schedule, AnEntryIsCreatedForTheSchedulerAndTheGroupDeleted)
     rsync_create_schedule("5", "2", "*", "*", "1", "root", "/usr/sbin/bakjob -r '100%'");
     rsync_create_schedule("6", "2", "*", "*", "1", "root", "/usr/sbin/bakjob -r 'b'");
     EXPECT_EQ(entries(), "/usr/sbin/bakjob -r '100%'|/usr/sbin/bakjob -r 'b'|");
-    EXPECT_NE(read_file("/etc/cron.d/device_scheduler").find("5 2 * * 1 root /usr/sbin/bakjob -r '100\\%'\n"),
-              std::string::npos);
+    EXPECT_TRUE(has(read_file(CRON), "5 2 * * 1 root /usr/sbin/bakjob -r '100\\%'\n"));
     for (const char *list : {"/system_mgr/crond/rsync/count", "/system_mgr/crond/list/count"})
         store_set(list, "2147483647");
     EXPECT_EQ(LIB_do_ctc(), 0) << "ends with the entries that are there, whatever the count says";
-    EXPECT_EQ(lines_of(read_file("/etc/cron.d/device_scheduler")).size(), 2U);
-    EXPECT_LT(LIB_create_xml("7", "2", "*", "*", "1", "root", "x", "rsync"), 0);
-    for (const char *list : {"/system_mgr/crond/rsync/count", "/system_mgr/crond/list/count"}) {
-        store_set(list, "0");
-        EXPECT_LT(LIB_create_xml("7", "2", "*", "*", "1", "root", "x", "rsync"), 0) << "in an entry's place";
-        store_set(list, list == std::string("/system_mgr/crond/list/count") ? "1" : "2");
-    }
-    EXPECT_EQ(entries(), "/usr/sbin/bakjob -r '100%'|/usr/sbin/bakjob -r 'b'|");
+    EXPECT_EQ(lines_of(read_file(CRON)).size(), 2U);
+    store_set("/system_mgr/crond/rsync/count", "2");
+    store_set("/system_mgr/crond/list/count", "1");
     rsync_delete_schedule();
     EXPECT_EQ(entries(), "");
-    EXPECT_EQ(read_file("/etc/cron.d/device_scheduler").find("bakjob -r"), std::string::npos);
+    EXPECT_FALSE(has(read_file(CRON), "bakjob -r"));
 }

@@ -8,9 +8,7 @@
 
 using namespace bakjob;
 
-class Shell : public Appliance
-{
-};
+using Shell = Appliance;
 
 TEST_F(Shell, ReportsHowACommandEnded)
 {
@@ -46,14 +44,16 @@ TEST_F(Shell, CommandsEndBySignalsAsTheCallerWould)
         return exit_code(run_shell("kill -" + std::to_string(signal) + " $$; exit 5")) - 128;
     };
     const auto at_pipe = std::signal(SIGPIPE, SIG_IGN);
-    for (const int signal : {SIGPIPE, SIGINT, SIGQUIT}) {
+    for (const int signal : {SIGPIPE, SIGINT, SIGQUIT})
         EXPECT_EQ(ended_by(signal), signal);
-    }
     EXPECT_EQ(first_reply_line("kill -PIPE $$; echo lives"), "");
     const auto at_interrupt = std::signal(SIGINT, SIG_IGN);
     EXPECT_EQ(ended_by(SIGINT), 5 - 128);
     EXPECT_EQ(std::signal(SIGINT, at_interrupt), SIG_IGN) << "as it was before the command";
     std::signal(SIGPIPE, at_pipe);
+    const auto at_size = std::signal(SIGXFSZ, SIG_IGN);
+    EXPECT_EQ(first_reply_line("ulimit -f 0; sh -c 'echo x >/tmp/x' || echo $?"), "153");
+    std::signal(SIGXFSZ, at_size);
 }
 
 TEST_F(Shell, OnlyTheFirstLineOfAReplyCounts)
@@ -118,23 +118,19 @@ TEST_F(Shell, WhatCannotBeQuotedIsRefused)
     EXPECT_TRUE(is_job_name(std::string(127, 'x')));
     EXPECT_FALSE(is_job_name(std::string(128, 'x')));
     for (const std::string path :
-         {"/a\"b", "/a\\b", "/a|b", "/a<b", "/a>b", "/a*", "/a?", "/a\tb", "/a\nb", "-rf", "~root"}) {
+         {"/a\"b", "/a\\b", "/a|b", "/a<b", "/a>b", "/a*", "/a?", "/a\tb", "/a\nb", "-rf", "~root"})
         EXPECT_FALSE(shell_path("x", path)) << path;
-    }
     EXPECT_TRUE(shell_path("x", std::string(1023, 'a')));
     EXPECT_FALSE(shell_path("x", std::string(1024, 'a')));
     EXPECT_FALSE(shell_path("x", std::string(512, ' '))) << "too long once escaped";
 
     for (const std::string host :
-         {"-oProxyCommand=x", "a b", "a;b", "$(x)", "`x`", "a'b", "a\nb", "a/b", "a@b", "[::1]"}) {
+         {"-oProxyCommand=x", "a b", "a;b", "$(x)", "`x`", "a'b", "a\nb", "a/b", "a@b", "[::1]"})
         EXPECT_TRUE(refusal_of_host(host)) << host;
-    }
-    for (const std::string host : {"10.0.0.1", "nas-2.example", "fe80::1", "fe80::1%eth0"}) {
+    for (const std::string host : {"10.0.0.1", "nas-2.example", "fe80::1", "fe80::1%eth0"})
         EXPECT_FALSE(refusal_of_host(host)) << host;
-    }
-    for (const std::string user : {"-l", "a b", "a:b", "a/b", "a&b", "a\"b"}) {
+    for (const std::string user : {"-l", "a b", "a:b", "a/b", "a&b", "a\"b"})
         EXPECT_TRUE(refusal_of_rsync_user(user)) << user;
-    }
     EXPECT_FALSE(refusal_of_rsync_user("bk@example.org"));
     EXPECT_FALSE(refusal_of_ssh_user("CORP/jd"));
     EXPECT_TRUE(refusal_of_ssh_user("ssh://x"));
@@ -161,7 +157,6 @@ TEST_F(Shell, APathIsRefusedOnlyForWhatAShellActsOnWhereItStands)
         }
     }
     for (const std::string path : {"#recycle", "~root", "=ls", "^a", "%1", "a!b", "a=~root", "a:~root", "-rf",
-                                   "a b", "a$b", "a;b", "a(b", "a'b", "a\nb", "a{b,c}", "a[b]", ""}) {
+                                   "a b", "a$b", "a;b", "a(b", "a'b", "a\nb", "a{b,c}", "a[b]", ""})
         EXPECT_EQ(!refusal_for_shells("x", path), path.empty()) << path;
-    }
 }

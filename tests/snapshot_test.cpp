@@ -13,11 +13,11 @@ namespace fs = std::filesystem;
 class Snapshot : public Appliance
 {
 protected:
-    static constexpr const char *FOLDER = "/mnt/HD/My Photos (1)";
+    inline static const std::string FOLDER = "/mnt/HD/My Photos (1)";
 
     static void make(const std::string &name, int number)
     {
-        const std::string path = FOLDER + std::string("/") + snapshot_name(name, number);
+        const std::string path = FOLDER + "/" + snapshot_name(name, number);
         write_file(path + "/file", "of " + std::to_string(number));
         const utimbuf times{.actime = 1000 + number, .modtime = 2000 + number};
         utime(path.c_str(), &times);
@@ -28,7 +28,7 @@ protected:
     {
         std::string all;
         for (int number = 0; number <= 11; ++number) {
-            const std::string path = FOLDER + std::string("/") + snapshot_name(name, number);
+            const std::string path = FOLDER + "/" + snapshot_name(name, number);
             struct stat status = {};
             if (stat(path.c_str(), &status) != 0) continue;
             all += std::to_string(number) + "=" + read_file(path + "/file").substr(3) + "@" +
@@ -46,12 +46,10 @@ TEST_F(Snapshot, TheRowMovesUpAndKeepsItsTimes)
             make(name, number);
         rsync_snapshot_rotate(FOLDER, 4, name);
         EXPECT_EQ(row(name), "0=0@2000 1=0@2000 2=1@2001 3=2@2002 ") << name;
-        EXPECT_EQ(run_options.inc_root_path, FOLDER + std::string("/") + snapshot_name(name, 0));
-        const std::string base = FOLDER + std::string("/");
-        EXPECT_TRUE(
-            fs::equivalent(base + snapshot_name(name, 0) + "/file", base + snapshot_name(name, 1) + "/file"));
-        EXPECT_FALSE(
-            fs::equivalent(base + snapshot_name(name, 1) + "/file", base + snapshot_name(name, 2) + "/file"));
+        const auto path = [&](int number) { return FOLDER + "/" + snapshot_name(name, number); };
+        EXPECT_EQ(run_options.inc_root_path, path(0));
+        EXPECT_TRUE(fs::equivalent(path(0) + "/file", path(1) + "/file"));
+        EXPECT_FALSE(fs::equivalent(path(1) + "/file", path(2) + "/file"));
         EXPECT_EQ(std::distance(fs::directory_iterator(FOLDER), fs::directory_iterator()), 4);
     }
 }
@@ -74,18 +72,14 @@ TEST_F(Snapshot, LengthIsBoundedAndGapsMoveUp)
     fs::create_directories(FOLDER);
     rsync_snapshot_rotate(FOLDER, 3, "j");
     EXPECT_EQ(row("j"), "");
-    EXPECT_EQ(run_options.inc_root_path, FOLDER + std::string("/j.0"));
+    EXPECT_EQ(run_options.inc_root_path, FOLDER + "/j.0");
 }
 
 TEST_F(Snapshot, NamesThatCannotBeQuotedMoveNothing)
 {
-    for (const auto &[folder, name] :
-         std::map<std::string, std::string>{{"", "j"}, {"/mnt/HD/a\"b", "j"}, {FOLDER, "a/../b"}}) {
-        run_options.debug_mode = 1;
-        testing::internal::CaptureStdout();
-        rsync_snapshot_rotate(folder, 3, name);
-        EXPECT_EQ(testing::internal::GetCapturedStdout().find("[rm"), std::string::npos);
-    }
+    run_options.debug_mode = 1;
+    for (const auto &[folder, name] : Keys{{"", "j"}, {"/mnt/HD/a\"b", "j"}, {FOLDER, "a/../b"}})
+        EXPECT_FALSE(has(printed_by([&] { rsync_snapshot_rotate(folder, 3, name); }), "[rm")) << folder;
     EXPECT_EQ(rotation_command("/a", "j", 2, 2), "rm -rf /a/j.2");
     EXPECT_EQ(rotation_command("/a", "j", 1, 2), "mv /a/j.1 /a/j.2");
     EXPECT_EQ(rotation_command("/a", "", 0, 2), "cp -al /a/backup.0 /a/backup.1");

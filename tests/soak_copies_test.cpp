@@ -4,11 +4,9 @@
 #include "transfer/snapshot_mark.h"
 
 #include <algorithm>
-#include <chrono>
 #include <csignal>
 #include <fcntl.h>
 #include <filesystem>
-#include <random>
 #include <unistd.h>
 
 using namespace bakjob;
@@ -17,26 +15,20 @@ namespace fs = std::filesystem;
 namespace
 {
 
-constexpr const char *REMOTE = "/remote/backup/S1_remote_backup/daily/Public";
+const std::string REMOTE = "/remote/backup/S1_remote_backup/daily/Public";
 
 std::string snapshot(int number)
 {
-    return SHARE + std::string("/daily.") + std::to_string(number);
-}
-
-void make_script(const std::string &path, const std::string &script)
-{
-    write_file(path, "#!/bin/sh\n" + script);
-    fs::permissions(path, fs::perms(0755));
+    return SHARE + "/daily." + std::to_string(number);
 }
 
 // Two states of the remote side, each with the number of its files in the file that is sent first.
 void set_remote_side(bool more)
 {
-    const std::string name = REMOTE + std::string("/more");
+    const std::string name = (REMOTE + "/more");
     if (more) shell("mkdir " + name + "; cd " + name + " && seq 1000 | xargs touch");
     if (!more) fs::remove_all(name);
-    write_file(REMOTE + std::string("/count"), more ? "2001" : "1001");
+    write_file((REMOTE + "/count"), more ? "2001" : "1001");
 }
 
 bool is_whole(const std::string &path)
@@ -67,17 +59,11 @@ TEST_F(Holds, AMarkedSnapshotIsWholeWhateverWasKilled)
 {
     if (!mark_whole(SHARE)) GTEST_SKIP() << "no extended attributes of root's here";
     add_job({{"backup_type", "2"}, {"inc_enable", "1"}, {"inc_number", "3"}});
-    shell(std::string("mkdir -p ") + REMOTE + "/a && cd " + REMOTE + "/a && seq 1000 | xargs touch");
+    shell("mkdir -p " + REMOTE + "/a && cd " + REMOTE + "/a && seq 1000 | xargs touch");
     set_remote_side(false);
     wait_for(start({"-r", "daily"}));
-    const auto begin = std::chrono::steady_clock::now();
-    wait_for(start({"-r", "daily"}));
-    const auto whole =
-        std::chrono::duration_cast<std::chrono::microseconds>(std::chrono::steady_clock::now() - begin);
-    std::mt19937 random(1);
-    const auto within = [&](auto most) {
-        return std::uniform_int_distribution<useconds_t>(0, static_cast<useconds_t>(most))(random);
-    };
+    const auto whole = time_of_run({"-r", "daily"});
+    Chance chance(1);
     int partial = 0;
     bool more = false;
     for (const std::string victim : {"cp", "mv", "rm", "run"}) {
@@ -85,16 +71,18 @@ TEST_F(Holds, AMarkedSnapshotIsWholeWhateverWasKilled)
         int failures = 0;
         for (int i = 0; i < tries; ++i) {
             set_remote_side(more = !more);
-            const std::string front = "/usr/local/bin/" + victim;
-            const std::string seconds = "0." + std::to_string(1'000'000 + within(60'000)).substr(1);
-            make_script(front, "exec timeout -s KILL " + seconds + " /bin/" + victim + " \"$@\"\n");
-            const pid_t run = start_group();
-            if (victim == "run") {
-                usleep(within(whole.count()));
-                kill(-run, SIGKILL);
+            {
+                const std::string seconds =
+                    "0." + std::to_string(1'000'000 + chance.number(0, 60'000)).substr(1);
+                const Fake killed("/usr/local/bin/" + victim,
+                                  "exec timeout -s KILL " + seconds + " /bin/" + victim + " \"$@\"\n");
+                const pid_t run = start_group();
+                if (victim == "run") {
+                    chance.pause(whole);
+                    kill(-run, SIGKILL);
+                }
+                wait_for(run);
             }
-            wait_for(run);
-            fs::remove(front);
             for (int number = 0; number < 4; ++number) {
                 const std::string path = snapshot(number);
                 const bool there = exists(path);
@@ -113,6 +101,12 @@ TEST_F(Holds, AMarkedSnapshotIsWholeWhateverWasKilled)
     EXPECT_GT(partial, 0) << "nothing was cut short: the kills came at the wrong moments";
 }
 
+// What is at the victim's, and whether it was touched.
+static std::string victim()
+{
+    return shell("find /tmp/victim -printf '%p %T@ %n\\n' | sort; cat /tmp/victim/daily.0/secret").output;
+}
+
 TEST_F(Holds, NothingBehindALinkAmongSnapshotsIsReadOrChanged)
 {
     struct Kind {
@@ -123,46 +117,33 @@ TEST_F(Holds, NothingBehindALinkAmongSnapshotsIsReadOrChanged)
         Keys keys;
     };
     const std::vector<std::string> all = {"before", "list", "write", "rm", "mv", "cp", "dry", "run"};
+    const Keys pull = {{"backup_type", "2"}, {"inc_enable", "1"}};
     const std::vector<Kind> kinds = {
-        {{"-r", "daily"}, "state", "4", all, {{"backup_type", "2"}, {"inc_enable", "1"}}},
+        {{"-r", "daily"}, "state", "4", all, pull},
         {{"-i", "x", "-r", "daily"}, "rstate", "4", all, {{"inc_enable", "1"}}},
-        {{"-n", "1", "-r", "daily"},
-         "state",
-         "9",
-         {"before", "write", "dry"},
-         {{"backup_type", "2"}, {"inc_enable", "1"}}}};
+        {{"-n", "1", "-r", "daily"}, "state", "9", {"before", "write", "dry"}, pull}};
     const std::vector<std::string> plants = {"ln -s /tmp/victim ", "ln -s /tmp/victim/daily.0 ",
                                              "ln -s /tmp/made ", "mkfifo ", "echo x >"};
     // Does what the program does, and at the right moment puts something there.
-    const std::string behind =
-        "code=$?\n[ \"$kind\" != \"$(cat /tmp/moment 2>/dev/null)\" ] || sh /tmp/plant\nexit $code\n";
-    const Fake rsync("/usr/sbin/rsync",
-                     "case $* in\n*--server*) kind=none ;;\n*--job-name=*--dry-run*) kind=dry ;;\n"
-                     "*--job-name=*) kind=run ;;\n*--dry-run*) kind=write ;;\n*) kind=list "
-                     ";;\nesac\n/usr/sbin/rsync.real \"$@\"\n" +
-                         behind);
-    for (const std::string program : {"rm", "mv", "cp"})
-        make_script("/usr/local/bin/" + program,
-                    "kind=" + program + "\n/bin/" + program + " \"$@\"\n" + behind);
-    const auto victim = [] {
-        return shell("find /tmp/victim -printf '%p %T@ %n\\n' | sort; cat /tmp/victim/daily.0/secret").output;
+    const auto with_plant = [](const std::string &kind, const std::string &program) {
+        return kind + program + " \"$@\"\ncode=$?\n[ \"$kind\" != \"$(cat /tmp/moment 2>/dev/null)\" ] || " +
+               "sh /tmp/plant\nexit $code\n";
     };
-    std::mt19937 random(2);
-    const auto one_of = [&](const auto &choices) {
-        return choices[std::uniform_int_distribution<std::size_t>(0, choices.size() - 1)(random)];
-    };
+    const Fake rsync(RSYNC, with_plant(KIND_OF_CALL, RSYNC + ".real"));
+    const Fake rm("/usr/local/bin/rm", with_plant("kind=rm\n", "/bin/rm"));
+    const Fake mv("/usr/local/bin/mv", with_plant("kind=mv\n", "/bin/mv"));
+    const Fake cp("/usr/local/bin/cp", with_plant("kind=cp\n", "/bin/cp"));
+    Chance chance(2);
     const int tries = rounds(12, 100);
     int failures = 0;
     for (int i = 0; i < tries; ++i) {
         SetUp();
-        const Kind kind = one_of(kinds);
-        const std::string moment = one_of(kind.moments);
-        const bool recovers = kind.arguments[0] == "-n";
-        const int number = recovers ? 0 : one_of(std::vector{0, 1, 2});
-        const std::string plant =
-            "/bin/rm -rf " + snapshot(number) + "; " + one_of(plants) + snapshot(number) + "\n";
+        const Kind kind = chance.one_of(kinds);
+        const std::string moment = chance.one_of(kind.moments);
+        const std::string path = snapshot(kind.arguments[0] == "-n" ? 0 : chance.number(0, 2));
+        const std::string plant = "/bin/rm -rf " + path + "; " + chance.one_of(plants) + path + "\n";
         fs::remove_all("/remote/backup/S1_remote_backup/daily");
-        write_file(REMOTE + std::string("/file"), "remote");
+        write_file(REMOTE + "/file", "remote");
         for (int older = 0; older < 3; ++older)
             write_file(snapshot(older) + "/file", "local");
         write_file("/tmp/victim/daily.0/secret", "secret");
@@ -182,7 +163,5 @@ TEST_F(Holds, NothingBehindALinkAmongSnapshotsIsReadOrChanged)
         ++failures;
         ADD_FAILURE() << kind.arguments[0] << " " << moment << " " << plant << trace << victim();
     }
-    for (const char *program : {"rm", "mv", "cp"})
-        fs::remove(std::string("/usr/local/bin/") + program);
     expect_none_of(tries, failures, "links and files put among snapshots: nothing behind them touched");
 }

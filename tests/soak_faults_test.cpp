@@ -4,13 +4,9 @@
 #include "ctl_support.h"
 #include "soak_support.h"
 
-#include <algorithm>
 #include <array>
-#include <cstdlib>
 #include <filesystem>
 #include <regex>
-#include <utility>
-#include <vector>
 
 namespace fs = std::filesystem;
 
@@ -37,21 +33,14 @@ constexpr const char *COPY = "/remote/backup/S1_remote_backup/one/Public/file";
 // Where a run copies to that cannot read the serial text.
 constexpr const char *COPY_WITHOUT_SERIAL = "/remote/backup/_remote_backup/one/Public/file";
 constexpr const char *UNRECORDED = "/var/run/bakjob_one.unrecorded";
-constexpr std::array KEPT = {STORE, FLASH, CRON};
-using Contents = std::array<std::string, KEPT.size()>;
-
-// Runs passes through states, and a run that is broken off may leave any of them.
-std::string without_states(const std::string &text)
+// Of the store, flash and cron's file. A run passes through states, and one that is broken off may leave any
+// of them.
+std::vector<std::string> contents()
 {
     static const std::regex states("<(state|last_do_job_time)>[^<]*<");
-    return std::regex_replace(text, states, "<$1><");
-}
-
-Contents contents()
-{
-    Contents all;
-    std::transform(KEPT.begin(), KEPT.end(), all.begin(),
-                   [](const char *path) { return without_states(read_file(path)); });
+    std::vector<std::string> all;
+    for (const std::string &path : {STORE, FLASH, CRON})
+        all.push_back(std::regex_replace(read_file(path), states, "<$1><"));
     return all;
 }
 
@@ -61,9 +50,8 @@ protected:
     void SetUp() override
     {
         Holds::SetUp();
-        for (const char *name : {"one", "two", "three"}) {
+        for (const char *name : {"one", "two", "three"})
             add_job({{"job_name", name}, {"state", std::string(name) == "one" ? "0" : "3"}});
-        }
         ASSERT_EQ(ctl("schedule two '1 2 * * *'").status, 0);
         remember();
     }
@@ -71,11 +59,10 @@ protected:
     // What each command begins with, from now on.
     void remember()
     {
-        const std::string copy =
-            "rm -rf /var/tmp/kept && mkdir /var/tmp/kept && cp -a /etc/NAS_CFG/config.xml "
-            "/var/tmp/kept/store && cp -a /var/lib/device_flash/config.xml /var/tmp/kept/flash "
-            "&& cp -a /etc/cron.d/device_scheduler /var/tmp/kept/cron";
-        ASSERT_EQ(shell(copy).status, 0);
+        ASSERT_EQ(shell("rm -rf /var/tmp/kept && mkdir /var/tmp/kept && cp -a --parents " + STORE + " " +
+                        FLASH + " " + CRON + " /var/tmp/kept")
+                      .status,
+                  0);
         before_ = contents();
     }
 
@@ -88,12 +75,9 @@ protected:
     // Puts back what each command begins with.
     static void put_back()
     {
-        shell("rm -rf /etc/NAS_CFG/* /var/lib/device_flash/* /var/run/bakjob_* /tmp/r_* /tmp/rsync_* "
-              "/remote/backup/S1_remote_backup/one/* /remote/backup/_remote_backup; mkdir -p "
-              "/remote/backup/S1_remote_backup/one; "
-              "cp -a /var/tmp/kept/store /etc/NAS_CFG/config.xml; "
-              "cp -a /var/tmp/kept/flash /var/lib/device_flash/config.xml; "
-              "cp -a /var/tmp/kept/cron /etc/cron.d/device_scheduler");
+        const std::string remote = "/remote/backup/S1_remote_backup/one";
+        shell("rm -rf /etc/NAS_CFG/* /var/lib/device_flash/* /var/run/bakjob_* /tmp/r_* /tmp/rsync_* " +
+              remote + "/* /remote/backup/_remote_backup; mkdir -p " + remote + "; cp -a /var/tmp/kept/. /");
         write_file("/var/run/bakjob_three.pid", "2147483646\n");
     }
 
@@ -109,11 +93,10 @@ protected:
     // Nothing, or what is wrong after a command that met a fault.
     [[nodiscard]] std::string wrong(const Command &command, const Ran &ran) const
     {
-        const Contents now = contents();
-        for (std::size_t i = 0; i < now.size(); ++i) {
+        const auto now = contents();
+        for (std::size_t i = 0; i < now.size(); ++i)
             if (now[i] != before_[i] && now[i] != after_[i])
-                return KEPT[i] + std::string(" is neither old nor new");
-        }
+                return std::vector{"store", "flash", "cron"}[i] + std::string(" is neither old nor new");
         if (now[0] == before_[0] && now[1] != before_[1]) return "flash is ahead of the store";
         if (command.by_status && ran.status == 0 && now != after_) return "success was told";
         const bool done = read_file(STORE).find("<state>2</state>") != std::string::npos;
@@ -140,14 +123,9 @@ protected:
     int failures_ = 0;
 
 private:
-    Contents before_;
-    Contents after_;
+    std::vector<std::string> before_;
+    std::vector<std::string> after_;
 };
-
-int number_in(const std::string &text)
-{
-    return std::atoi(text.c_str());
-}
 
 } // namespace
 
@@ -165,10 +143,10 @@ TEST_F(HoldsThroughFaults, SystemCallsThatFail)
         for (const auto &[call, reads] : calls) {
             const bool all_files = soak_table() != nullptr || !reads;
             const std::string trace =
-                "strace " + (all_files ? std::string() : "-P " + std::string(STORE)) + " -e trace=" + call;
+                "strace " + (all_files ? std::string() : "-P " + STORE) + " -e trace=" + call;
             put_back();
             shell(trace + " -o /var/tmp/calls /usr/sbin/" + command.words);
-            const int all = number_in(shell("grep -c '^" + call + "(' /var/tmp/calls").output);
+            const int all = std::stoi(shell("grep -c '^" + call + "(' /var/tmp/calls").output);
             for (int n = all; n > 0; n -= reads ? 1 : rounds(std::max(1, all / 2), 1)) {
                 for (int i = 0; i < rounds(1, ERRORS.size()); ++i) {
                     const char *const error = ERRORS[static_cast<std::size_t>(turn++) % ERRORS.size()];
@@ -189,7 +167,7 @@ TEST_F(HoldsThroughFaults, MemoryThatEnds)
         learn(command);
         put_back();
         shell(preload + " FAIL_COUNT=/var/tmp/allocations /usr/sbin/" + command.words);
-        const int all = number_in(read_file("/var/tmp/allocations"));
+        const int all = std::stoi(read_file("/var/tmp/allocations"));
         ASSERT_GT(all, 30) << command.words;
         const int step = std::max(1, all / rounds(6, 220));
         for (int n = all; n > 0; n -= step) {
@@ -204,9 +182,8 @@ TEST_F(HoldsThroughFaults, MemoryThatEnds)
 // The limit is swept over all sizes at which a command ends somewhere between its start and its end.
 TEST_F(HoldsThroughFaults, AddressSpaceThatEnds)
 {
-    for (int i = 0; i < 300; ++i) {
+    for (int i = 0; i < 300; ++i)
         add_job({{"job_name", "many" + std::to_string(i)}});
-    }
     remember();
     const Command &add = COMMANDS[0];
     learn(add);

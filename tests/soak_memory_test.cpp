@@ -37,7 +37,7 @@ int allocations_left = -1; // until one fails; below 0: none does
 TEST_F(Holds, ALackOfMemoryEndsARunInOrder)
 {
     const JobToHoldUp job;
-    const Fake rsync("/usr/sbin/rsync", "");
+    const Fake rsync(RSYNC, "");
     enum Ending { DONE = 3, NOT_SHORT, REFUSED, FAILED };
     const auto run = [](int allocations) {
         return in_child([&] {
@@ -64,12 +64,11 @@ TEST_F(Holds, ALackOfMemoryEndsARunInOrder)
         broken_off += state == "8" || kept ? 1 : 0;
         const bool ended =
             ending == FAILED ? state == "8" || state == "0" || kept : ending != REFUSED || state == "0";
-        if (!ended || exists("/var/run/bakjob_daily.pid") || job_key(1, "job_name") != "daily") {
+        if (!ended || exists(PID_FILE) || job_key(1, "job_name") != "daily") {
             ++failures;
             ADD_FAILURE() << allocations << " " << ending << " state " << state;
-            shell("rm -f /var/run/bakjob_daily.pid");
         }
-        shell("rm -f /var/run/bakjob_daily.unrecorded");
+        shell("rm -f /var/run/bakjob_daily.*");
         if (ending == NOT_SHORT) break;
     }
     EXPECT_GT(broken_off, 10);

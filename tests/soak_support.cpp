@@ -3,7 +3,6 @@
 #include <arpa/inet.h>
 #include <csignal>
 #include <cstdlib>
-#include <fcntl.h>
 #include <filesystem>
 #include <fstream>
 #include <sys/socket.h>
@@ -22,28 +21,6 @@ int rounds(int here, int soaking)
     return soak_table() == nullptr ? here : soaking;
 }
 
-pid_t start(const std::vector<std::string> &arguments)
-{
-    const pid_t child = fork();
-    if (child != 0) return child;
-    const int output = open("/tmp/output", O_WRONLY | O_CREAT | O_TRUNC, 0600);
-    dup2(output, STDOUT_FILENO);
-    dup2(output, STDERR_FILENO);
-    std::vector<char *> argv{const_cast<char *>("bakjob")};
-    for (const std::string &argument : arguments)
-        argv.push_back(const_cast<char *>(argument.c_str()));
-    argv.push_back(nullptr);
-    execv("/usr/sbin/bakjob", argv.data());
-    _exit(127);
-}
-
-int wait_for(pid_t child)
-{
-    int status = 0;
-    waitpid(child, &status, 0);
-    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
-}
-
 std::string traced(std::vector<std::string> arguments)
 {
     arguments.insert(arguments.begin(), "-d");
@@ -53,10 +30,7 @@ std::string traced(std::vector<std::string> arguments)
 
 void Holds::SetUp()
 {
-    Appliance::SetUp();
-    add_share("Public", SHARE);
-    write_file(std::string(SHARE) + "/file", "x");
-    write_file("/tmp/kv_serial.txt", "S1");
+    ApplianceWithShare::SetUp();
     shell("mkdir -p ~root/.ssh"); // as a first ssh login would
     fs::create_directories("/remote/backup/S1_remote_backup/daily");
     fs::create_directories("/remote/data/S1_remote_backup/daily");
@@ -67,6 +41,18 @@ void Holds::expect_none_of(int tries, int failures, const std::string &what)
     EXPECT_EQ(failures, 0) << what;
     if (soak_table() != nullptr)
         std::ofstream(soak_table(), std::ios::app) << what << '\t' << tries << '\t' << failures << '\n';
+}
+
+void Chance::pause(std::chrono::microseconds most)
+{
+    usleep(static_cast<useconds_t>(number(0, static_cast<int>(most.count()))));
+}
+
+std::chrono::microseconds time_of_run(const std::vector<std::string> &arguments)
+{
+    const auto begin = std::chrono::steady_clock::now();
+    wait_for(start(arguments));
+    return std::chrono::duration_cast<std::chrono::microseconds>(std::chrono::steady_clock::now() - begin);
 }
 
 BadServer::BadServer(const std::function<void(int)> &behave, std::uint16_t port)

@@ -5,28 +5,19 @@
 
 #include "support.h"
 
-#include <functional>
-#include <string>
-#include <sys/types.h>
-#include <vector>
-
-inline constexpr const char *SHARE = "/mnt/HD/HD_a2/Public";
+#include <chrono>
+#include <cstdint>
+#include <random>
 
 // The file of the table; null in the tests.
 const char *soak_table();
 
 int rounds(int here, int soaking);
 
-// Starts the program; its output goes to /tmp/output.
-pid_t start(const std::vector<std::string> &arguments);
-
-// The exit code of a child, or 128 and the signal that ended it.
-int wait_for(pid_t child);
-
-// Runs the program with arguments that no shell sees. Its trace.
+// The program's trace of a run with these arguments, which no shell sees.
 std::string traced(std::vector<std::string> arguments);
 
-class Holds : public Appliance
+class Holds : public ApplianceWithShare
 {
 protected:
     void SetUp() override;
@@ -34,6 +25,27 @@ protected:
     // A row of the soak's table, and the verdict.
     static void expect_none_of(int tries, int failures, const std::string &what);
 };
+
+// The same numbers in every soak.
+class Chance
+{
+public:
+    explicit Chance(unsigned seed) : random_(seed) {}
+    int number(int from, int to) { return std::uniform_int_distribution(from, to)(random_); }
+    template <typename Choices>
+    auto one_of(const Choices &choices)
+    {
+        return choices[static_cast<std::size_t>(number(0, static_cast<int>(std::size(choices)) - 1))];
+    }
+    // Some moment of the time.
+    void pause(std::chrono::microseconds most);
+
+private:
+    std::mt19937 random_;
+};
+
+// How long a run takes.
+std::chrono::microseconds time_of_run(const std::vector<std::string> &arguments);
 
 // A server on 127.0.0.9 that does to each connection as told.
 class BadServer

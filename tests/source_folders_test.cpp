@@ -17,15 +17,12 @@ protected:
     void SetUp() override
     {
         Appliance::SetUp();
-        add_share("Public", "/mnt/HD/HD_a2/Public");
+        add_share("Public", SHARE);
         add_share("Inner", "/mnt/HD/HD_a2/Public/inner");
         add_share("Public2", "/mnt/HD/HD_a2/Public2");
         add_share("Gone", "/mnt/HD/HD_a2/Gone");
         fs::remove_all("/mnt/HD/HD_a2/Gone");
-        fs::create_directories("/mnt/HD/HD_a2/Public/x/y");
-        write_file("/mnt/HD/HD_a2/Public/x/f.txt", "");
-        write_file("/mnt/HD/HD_a2/Public/g.txt", "");
-        fs::create_directory_symlink("/tmp", "/mnt/HD/HD_a2/Public/x/link");
+        shell("cd " + SHARE + " && mkdir -p x/y && touch x/f.txt g.txt && ln -s /tmp x/link");
     }
 };
 
@@ -37,7 +34,7 @@ TEST_F(Folders, LieInTheFirstShareThatHoldsThem)
         std::string remote;
         std::string subdir;
     };
-    const std::string base = "/mnt/HD/HD_a2/Public";
+    const std::string &base = SHARE;
     const std::vector<Case> cases = {
         {base, 0, "/base/Public", "/"},
         {base + "/x/y", 0, "/base/Public", "/x/y"},
@@ -123,9 +120,8 @@ TEST_F(Folders, ProgressAndSerialAreReadAndWrittenSafely)
         EXPECT_STREQ(serial, "as it was") << made;
         EXPECT_NE(rsync_serial_refusal(), "") << made;
         run_options.debug_mode = 1;
-        testing::internal::CaptureStdout();
-        EXPECT_FALSE(rsync_remote_root(named("j"))) << made;
-        EXPECT_TRUE(testing::internal::GetCapturedStdout().starts_with("ERROR: serial text of [")) << made;
+        const auto ask = [] { EXPECT_FALSE(rsync_remote_root(named("j"))); };
+        EXPECT_TRUE(printed_by(ask).starts_with("ERROR: serial text of [")) << made;
         run_options.debug_mode = 0;
     }
 }

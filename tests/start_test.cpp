@@ -13,15 +13,7 @@
 namespace
 {
 
-class Start : public Ctl
-{
-protected:
-    void SetUp() override
-    {
-        Ctl::SetUp();
-        ASSERT_TRUE(says(add("daily"), 0, ""));
-    }
-};
+using Start = CtlDaily;
 
 constexpr const char *LOCK = "/tmp/rsync_write_conf.lock";
 
@@ -32,15 +24,14 @@ TEST_F(Start, ClosedHandlesAreNobodysFiles)
     const std::string closed = " <&- >&- 2>&-";
     unlink(LOCK);
     {
-        const Fake rsync("/usr/sbin/rsync",
-                         "for i in 0 1 2; do [ -e /proc/$$/fd/$i ] || echo $i >>/tmp/closed; done\n"
-                         "exec /usr/sbin/rsync.real \"$@\"\n");
+        const Fake rsync(RSYNC, "for i in 0 1 2; do [ -e /proc/$$/fd/$i ] || echo $i >>/tmp/closed; done\n"
+                                "exec /usr/sbin/rsync.real \"$@\"\n");
         EXPECT_EQ(shell("/usr/sbin/bakjob -d -r daily" + closed).status, 0);
     }
     EXPECT_EQ(job_key(1, "state"), "2");
     EXPECT_FALSE(exists("/tmp/closed")) << "a transfer would write its messages into files of its own";
     EXPECT_EQ(read_file(LOCK), "");
-    EXPECT_EQ(read_file("/remote/backup/S123_remote_backup/daily/Public/a"), "a");
+    EXPECT_EQ(read_file("/remote/backup/S1_remote_backup/daily/Public/file"), "x");
     unlink(LOCK);
     EXPECT_EQ(shell("/usr/sbin/bakjobctl list" + closed).status, 0);
     EXPECT_EQ(shell("/usr/sbin/bakjobctl check daily --probe" + closed).status, 0);
@@ -63,7 +54,7 @@ TEST_F(Start, ATraceThatNobodyReadsStopsNoBackup)
                           "{ exec <&-; touch /tmp/gone; }' 2>&1");
     EXPECT_EQ(read_file("/tmp/status"), "0\n") << ran.output;
     EXPECT_EQ(job_key(1, "state"), "2");
-    EXPECT_FALSE(exists("/var/run/bakjob_daily.pid"));
+    EXPECT_FALSE(exists(PID_FILE));
 }
 
 TEST_F(Start, WhatCannotBeSaidIsAFailure)

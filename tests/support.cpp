@@ -1,14 +1,17 @@
 #include "support.h"
 
 #include "common/run_options.h"
+#include "common/text.h"
 #include "config/job_list.h"
 #include "platform/config_store.h"
 
 #include <array>
 #include <chrono>
+#include <fcntl.h>
 #include <filesystem>
 #include <fstream>
 #include <sstream>
+#include <sys/mount.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <system_error>
@@ -49,20 +52,64 @@ Ran shell(const std::string &command)
     std::string output;
     FILE *const pipe = popen(command.c_str(), "r"); // NOLINT(cert-env33-c)
     std::array<char, 4096> buffer{};
-    for (std::size_t n = 0; (n = fread(buffer.data(), 1, buffer.size(), pipe)) > 0;) {
+    for (std::size_t n = 0; (n = fread(buffer.data(), 1, buffer.size(), pipe)) > 0;)
         output.append(buffer.data(), n);
-    }
     const int status = pclose(pipe);
     return {WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status), output};
+}
+
+pid_t start(const std::vector<std::string> &arguments)
+{
+    const pid_t child = fork();
+    if (child != 0) return child;
+    const int output = open("/tmp/output", O_WRONLY | O_CREAT | O_TRUNC, 0600);
+    dup2(output, STDOUT_FILENO);
+    dup2(output, STDERR_FILENO);
+    std::vector<char *> argv{const_cast<char *>("bakjob")};
+    for (const std::string &argument : arguments)
+        argv.push_back(const_cast<char *>(argument.c_str()));
+    argv.push_back(nullptr);
+    execv("/usr/sbin/bakjob", argv.data());
+    _exit(127);
+}
+
+int wait_for(pid_t child)
+{
+    int status = 0;
+    waitpid(child, &status, 0);
+    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
 }
 
 int in_child(const std::function<int()> &body)
 {
     const pid_t child = fork();
     if (child == 0) _exit(body());
-    int status = 0;
-    waitpid(child, &status, 0);
-    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+    return wait_for(child);
+}
+
+void become_neighbour()
+{
+    if (setgid(65534) != 0 || setuid(65534) != 0) _exit(1);
+}
+
+std::string printed_by(const std::function<void()> &body)
+{
+    testing::internal::CaptureStdout();
+    body();
+    return testing::internal::GetCapturedStdout();
+}
+
+std::string complaints_of(const std::function<void()> &body)
+{
+    testing::internal::CaptureStderr();
+    body();
+    return testing::internal::GetCapturedStderr();
+}
+
+testing::AssertionResult has(const std::string &text, const std::string &part)
+{
+    if (text.find(part) != std::string::npos) return testing::AssertionSuccess();
+    return testing::AssertionFailure() << "not in it: " << part << "\n" << text;
 }
 
 bool eventually(const std::function<bool()> &condition, int seconds)
@@ -78,9 +125,8 @@ bool eventually(const std::function<bool()> &condition, int seconds)
 bool has_open(pid_t process, const std::string &path)
 {
     std::error_code none;
-    for (const auto &handle : fs::directory_iterator("/proc/" + std::to_string(process) + "/fd", none)) {
+    for (const auto &handle : fs::directory_iterator("/proc/" + std::to_string(process) + "/fd", none))
         if (fs::equivalent(handle.path(), path, none)) return true;
-    }
     return false;
 }
 
@@ -93,8 +139,17 @@ void Appliance::SetUp()
           " -xdev -mindepth 1 -delete 2>/dev/null; "
           "rm -rf /run/bakjob_*");
     fs::remove("/var/log/device_alerts");
-    fs::remove("/etc/cron.d/device_scheduler");
+    fs::remove(CRON);
     bakjob::run_options = {};
+}
+
+void ApplianceWithShare::SetUp()
+{
+    Appliance::SetUp();
+    add_share("Public", SHARE);
+    write_file(SHARE + "/file", "x");
+    write_file("/tmp/kv_serial.txt", "S1");
+    shell("rm -f ~root/.ssh/known_hosts");
 }
 
 void Appliance::TearDown()
@@ -126,42 +181,31 @@ std::string store_get(const std::string &path)
 
 void store_save()
 {
-    ASSERT_EQ(xml_write_file("/etc/NAS_CFG/config.xml"), 0);
+    ASSERT_EQ(xml_write_file(STORE.c_str()), 0);
+}
+
+Keys keys_of(const std::string &words)
+{
+    Keys keys;
+    std::istringstream stream(words);
+    for (std::string word; stream >> word;)
+        keys[word.substr(0, word.find('='))] = word.substr(word.find('=') + 1);
+    return keys;
 }
 
 int add_job(const Keys &keys)
 {
-    Keys all{{"enable", "1"},
-             {"state", "0"},
-             {"pwd_encoded", "0"},
-             {"server_type", "2"},
-             {"backup_type", "1"},
-             {"rsync_mode", "2"},
-             {"schedule_mode", "1"},
-             {"use_ssh", "0"},
-             {"keep_exist_file", "0"},
-             {"inc_enable", "0"},
-             {"inc_number", "3"},
-             {"retry", "0"},
-             {"retry_interval", "1"},
-             {"rsync_timeout", "30"},
-             {"job_name", "daily"},
-             {"rsync_user", "bk"},
-             {"rsync_pwd", "secret"},
-             {"ssh_user", "root"},
-             {"ssh_pwd", ""},
-             {"port", "873"},
-             {"remote_ip", "127.0.0.1"},
-             {"remote_path", "backup"},
-             {"local_path", "/mnt/HD/HD_a2/Public"},
-             {"rstate", "0"}};
+    Keys all = keys_of("enable=1 state=0 rstate=0 pwd_encoded=0 server_type=2 backup_type=1 rsync_mode=2 "
+                       "schedule_mode=1 use_ssh=0 keep_exist_file=0 inc_enable=0 inc_number=3 retry=0 "
+                       "retry_interval=1 rsync_timeout=30 job_name=daily rsync_user=bk rsync_pwd=secret "
+                       "ssh_user=root ssh_pwd= port=873 remote_ip=127.0.0.1 remote_path=backup local_path=" +
+                       SHARE);
     for (const auto &[key, value] : keys)
         all[key] = value;
     const int item = std::max(0, xml_get_int("/backup_mgr/rsync/count")) + 1;
     store_set("/backup_mgr/rsync/count", std::to_string(item));
-    for (const auto &[key, value] : all) {
+    for (const auto &[key, value] : all)
         store_set("/backup_mgr/rsync/item:" + std::to_string(item) + "/" + key, value);
-    }
     store_save();
     return item;
 }
@@ -181,6 +225,18 @@ void add_share(const std::string &name, const std::string &path)
     fs::create_directories(path);
 }
 
+void set_schedule(const std::vector<std::string> &commands)
+{
+    const std::string entries = "/system_mgr/crond/rsync/";
+    const int groups = std::max(0, xml_get_int("/system_mgr/crond/list/count")) + 1;
+    store_set("/system_mgr/crond/list/count", std::to_string(groups));
+    store_set("/system_mgr/crond/list/name:" + std::to_string(groups), "rsync");
+    store_set(entries + "count", std::to_string(commands.size()));
+    for (std::size_t i = 0; i < commands.size(); ++i)
+        store_set(entries + "item:" + std::to_string(i + 1) + "/run", commands[i]);
+    store_save();
+}
+
 bakjob::JobName named(const std::string &name)
 {
     return bakjob::JobName::checked(name).value();
@@ -189,31 +245,45 @@ bakjob::JobName named(const std::string &name)
 bakjob::RsyncJob make_job(const std::string &name)
 {
     bakjob::RsyncJob job{};
-    job.enable = job.pwd_encoded = 1;
+    job.enable = job.pwd_encoded = job.backup_type = 1;
     job.server_type = job.rsync_mode = 2;
-    job.backup_type = 1;
     job.rsync_timeout = 600;
-    snprintf(job.job_name, sizeof job.job_name, "%s", name.c_str());
-    snprintf(job.rsync_user, sizeof job.rsync_user, "bk");
-    snprintf(job.rsync_pwd, sizeof job.rsync_pwd, "c2VjcmV0");
-    snprintf(job.port, sizeof job.port, "873");
-    snprintf(job.remote_ip, sizeof job.remote_ip, "192.168.1.20");
-    snprintf(job.remote_path, sizeof job.remote_path, "backup/share1");
-    snprintf(job.local_path, sizeof job.local_path, "/srv/share1");
-    snprintf(job.rsync_pwd_file, sizeof job.rsync_pwd_file, "/tmp/r_%s.passwd", name.c_str());
+    EXPECT_TRUE(bakjob::copy_text(job.job_name, name) && bakjob::copy_text(job.rsync_user, "bk") &&
+                bakjob::copy_text(job.rsync_pwd, "c2VjcmV0") && bakjob::copy_text(job.port, "873") &&
+                bakjob::copy_text(job.remote_ip, "192.168.1.20") &&
+                bakjob::copy_text(job.remote_path, "backup/share1") &&
+                bakjob::copy_text(job.local_path, "/srv/share1") &&
+                bakjob::copy_text(job.rsync_pwd_file, "/tmp/r_" + name + ".passwd"));
     return job;
 }
 
 Fake::Fake(std::string program, const std::string &script) : program_(std::move(program))
 {
-    fs::rename(program_, program_ + ".real");
+    if (exists(program_)) fs::rename(program_, program_ + ".real");
     write_file(program_, "#!/bin/sh\n" + script);
     fs::permissions(program_, fs::perms(0755));
 }
 
 Fake::~Fake()
 {
-    fs::rename(program_ + ".real", program_);
+    fs::remove(program_);
+    if (exists(program_ + ".real")) fs::rename(program_ + ".real", program_);
+}
+
+ReadOnly::ReadOnly(std::string folder) : folder_(std::move(folder))
+{
+    EXPECT_EQ(mount(folder_.c_str(), folder_.c_str(), "", MS_BIND, nullptr), 0) << folder_;
+    EXPECT_EQ(mount(nullptr, folder_.c_str(), "", MS_REMOUNT | MS_BIND | MS_RDONLY, nullptr), 0);
+}
+
+ReadOnly::~ReadOnly()
+{
+    umount2(folder_.c_str(), MNT_DETACH);
+}
+
+std::vector<std::string> alerts()
+{
+    return lines_of(read_file("/var/log/device_alerts"));
 }
 
 Ran bakjob_program(const std::string &arguments)
@@ -228,9 +298,4 @@ std::vector<std::string> lines_of(const std::string &text)
     for (std::string line; std::getline(stream, line);)
         lines.push_back(line);
     return lines;
-}
-
-std::vector<std::string> alerts()
-{
-    return lines_of(read_file("/var/log/device_alerts"));
 }

@@ -53,15 +53,6 @@ TEST(Text, TrimsBlanksAndControlCharactersAtTheEndOnly)
     }
 }
 
-TEST(Text, ACopyThatDoesNotFitIsRefused)
-{
-    char field[4] = "old";
-    EXPECT_FALSE(copy_text(field, "four"));
-    EXPECT_STREQ(field, "old");
-    EXPECT_TRUE(copy_text(field, "new"));
-    EXPECT_STREQ(field, "new");
-}
-
 TEST(Password, FitsItsFieldUpTo93Characters)
 {
     char encoded[PASSWORD_SIZE] = "";

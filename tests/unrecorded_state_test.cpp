@@ -18,21 +18,20 @@ namespace
 
 constexpr const char *KEPT = "/var/run/bakjob_daily.unrecorded";
 
-class UnrecordedState : public Ctl
+class UnrecordedState : public CtlDaily
 {
 protected:
     void SetUp() override
     {
-        Ctl::SetUp();
-        ASSERT_TRUE(says(add("daily"), 0, ""));
+        CtlDaily::SetUp();
         ASSERT_EQ(bakjob_program("-r daily").status, 0);
         ASSERT_TRUE(says(ctl("status"), 0, "done"));
     }
 
     void TearDown() override
     {
-        read_only_.reset();
-        Ctl::TearDown();
+        unlock_configuration();
+        CtlDaily::TearDown();
     }
 
     void lock_configuration() { read_only_.emplace("/etc/NAS_CFG"); }
@@ -46,7 +45,7 @@ TEST_F(UnrecordedState, AFailedRunNeverReadsAsDone)
 {
     EXPECT_TRUE(says(ctl("check daily"), 0, "0 problems"));
     EXPECT_FALSE(exists(KEPT));
-    fs::remove_all("/mnt/HD/HD_a2/Public");
+    fs::remove_all(SHARE);
     lock_configuration();
     EXPECT_TRUE(says(ctl("check daily"), 1, "configuration: it cannot be written, so no run can record"));
     EXPECT_TRUE(says(bakjob_program("-d -r daily"), 0, "state 4 of [daily] is not recorded"));
@@ -61,7 +60,7 @@ TEST_F(UnrecordedState, AFailedRunNeverReadsAsDone)
 
     unlock_configuration();
     EXPECT_TRUE(says(ctl("status"), 1, words)) << "until it is recorded";
-    fs::create_directories("/mnt/HD/HD_a2/Public");
+    fs::create_directories(SHARE);
     ASSERT_EQ(bakjob_program("-r daily").status, 0);
     EXPECT_FALSE(exists(KEPT));
     EXPECT_TRUE(says(ctl("status"), 0, "done "));
