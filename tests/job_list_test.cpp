@@ -3,6 +3,7 @@
 #include "config/job_list.h"
 #include "config/job_store.h"
 #include "support.h"
+#include "transfer/backup.h"
 
 #include <filesystem>
 
