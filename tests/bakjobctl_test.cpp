@@ -306,15 +306,15 @@ TEST_F(Ctl, ARunIsFollowedToItsEnd)
                                        "*) set -- --bwlimit=1000 \"$@\" ;; esac\n"
                                        "exec /usr/sbin/rsync.real \"$@\"\n");
     const Ran lines = shell("/usr/sbin/bakjob -r daily & /usr/sbin/bakjobctl watch daily; wait");
-    EXPECT_TRUE(says(lines, 0, "folder 1/1  /mnt/HD/HD_a2/Public    0 %  "));
-    EXPECT_TRUE(says(lines, 0, " of 1500001 bytes"));
+    EXPECT_TRUE(says(lines, 0, "folder 1/1  /mnt/HD/HD_a2/Public  looking what there is to do\n"));
+    EXPECT_TRUE(says(lines, 0, " bytes moved\n"));
     EXPECT_TRUE(says(lines, 0, "daily: done "));
     EXPECT_TRUE(says(ctl("watch daily --json"), 0, "\"last\":\"done\""));
 
     shell("rm -r /remote/backup/S123*");
     const Ran drawn =
         shell("/usr/sbin/bakjob -r daily & script -qec '/usr/sbin/bakjobctl watch daily' /dev/null; wait");
-    EXPECT_TRUE(says(drawn, 0, ".] folder 1/1  /mnt/HD/HD_a2/Public    0 %"));
+    EXPECT_TRUE(says(drawn, 0, ".] folder 1/1  /mnt/HD/HD_a2/Public   66 %  1"));
     shell("rm -r /remote/backup/S123*/daily/Public");
     const Ran restore = shell("/usr/sbin/bakjob -i /mnt -r daily & "
                               "until [ -e /var/run/bakjob_daily.pid ]; do sleep 0.01; done; "

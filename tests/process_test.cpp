@@ -278,6 +278,7 @@ TEST_F(ProbeBound, EndsWhateverGoesOnForEver)
     const std::vector<Case> cases = {
         {"/usr/sbin/rsync --port=8731 127.0.0.9::", 30, ""},
         {"/usr/sbin/rsync --port=8732 127.0.0.9::", 30, "module"},
+        {"/usr/sbin/rsync --job-name=j --port=8731 -a 127.0.0.9::m/ /tmp --dump-size --dry-run", 30, ""},
         {ssh + "'while echo line; do sleep 0.1; done'", 255, "line"},
         {"/usr/sbin/rsync -n -e 'sh -c \"setsid sleep 4711 & sleep 4711\"' x:y /tmp", 30, ""}};
     for (const Case &one : cases) {
