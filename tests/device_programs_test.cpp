@@ -108,20 +108,69 @@ TEST_F(Programs, ATransferPublishesItsFigures)
     shell("ln -s /tmp/other '/tmp/r_it'\\''s 1'; ln -s /tmp/other '/tmp/r_it'\\''s 1.dump_size'");
     const std::string rsync = "/usr/sbin/rsync --job-name=it\\'s\\ 1 -aHq8 --dump-size ";
     const std::string ends = "/mnt/HD/x/ 127.0.0.1::data 2>/dev/null";
-    const std::string all = "                  30                30000\n";
+    const std::string moved = "                  30                30000\n";
     EXPECT_EQ(shell(rsync + "--dry-run " + ends).output, "");
-    EXPECT_EQ(read_file("/tmp/r_it's 1.dump_size"), all);
+    EXPECT_FALSE(exists("/tmp/r_it's 1.dump_size")) << "known when all is moved";
     EXPECT_FALSE(exists("/remote/data/29"));
     EXPECT_EQ(shell(rsync + ends).output, "");
-    EXPECT_EQ(read_file("/tmp/r_it's 1"), all);
-    EXPECT_EQ(shell(rsync + "--dry-run " + ends).status, 0);
-    EXPECT_EQ(read_file("/tmp/r_it's 1.dump_size"), "                   0                    0\n");
+    EXPECT_EQ(read_file("/tmp/r_it's 1"), moved + "                3100                 3100\n");
+    EXPECT_EQ(read_file("/tmp/r_it's 1.dump_size"), moved);
+
+    // More files than may be listed at once; those that are there already are not moved.
+    for (int i = 30; i < 300; ++i) {
+        write_file("/mnt/HD/x/" + std::to_string(i), std::string(1000, 'x'));
+    }
+    EXPECT_EQ(shell("DEVICE_MOST_LISTED=150 " + rsync + ends).status, 0);
+    EXPECT_TRUE(exists("/remote/data/299"));
+    EXPECT_EQ(read_file("/tmp/r_it's 1.dump_size"), "                 270               270000\n");
+    EXPECT_EQ(read_file("/tmp/r_it's 1").substr(42), "               30100                30100\n");
     EXPECT_EQ(read_file("/tmp/other"), "untouched");
 
     // However a transfer ends, its caller hears of it.
     EXPECT_EQ(shell(rsync + "/mnt/HD/none " + ends).status, 23);
     EXPECT_EQ(shell(rsync + "/mnt/HD/x/ 127.0.0.1::none 2>/dev/null").status, 5);
+    EXPECT_FALSE(exists("/tmp/r_it's 1.dump_size")) << "it did not come to its end";
     EXPECT_EQ(shell("/usr/sbin/rsync --job-name=a/b --dump-size -aq8 " + ends).status, 0);
+}
+
+// The dry run of a job tries the start alone, and what it says is what the whole one says.
+TEST_F(Programs, ADryRunOfAJobFailsAsTheWholeOneDoes)
+{
+    shell("mkdir -p /mnt/HD/many /mnt/HD/empty /mnt/HD/there /remote/data/there && cd /mnt/HD && "
+          "seq 120 | split -l1 -a3 - many/ && echo x >file && ln -s none dangling && "
+          "cp -r file many empty dangling /remote/data && cp -r many file /remote/archive");
+    struct Case {
+        std::string source, target;
+        int status;
+    };
+    const std::string data = "127.0.0.1::data/", shelled = "root@127.0.0.1:/remote/data/", here = "/mnt/HD/";
+    std::vector<Case> cases = {
+        {here + "many/", "127.0.0.1::archive/there", 1},
+        {"127.0.0.1::archive/many/", here + "there", 0},
+        {here + "many/", "127.0.0.1::backup/x", 5},
+        {"127.0.0.1::nomodule/many/", here + "there", 5},
+        {here + "many/", "rsync://127.0.0.1:2/data/there", 10},
+    };
+    for (const auto &[from, to] : {std::pair(here, data), {data, here}, {here, shelled}, {shelled, here}}) {
+        cases.push_back({from + "none/", to + "there", 23});
+        cases.push_back({from + "many/", to + "none/none", 0});
+        cases.push_back({from + "empty/", to + "none/none", 3});
+        if (from == shelled || to == shelled) continue;
+        cases.push_back({from + "none/none", to + "there", 23});
+        cases.push_back({from + "many/", to + "file", 3});
+        cases.push_back({from + "many/", to + "dangling", 0});
+        cases.push_back({from + "file", to + "none/none", 3});
+        cases.push_back({from + "file/", to + "none", 23});
+    }
+    for (const Case &one : cases) {
+        const bool daemon = (one.source + one.target).find("root@") == std::string::npos;
+        const std::string command = std::string("/usr/sbin/rsync --job-name=j -aHq8 --delete ") +
+                                    (daemon ? "" : "-e '/usr/sbin/ssh -d cm9vdHB3' ") + one.source + " " +
+                                    one.target + " --dry-run </dev/null >/dev/null 2>&1";
+        EXPECT_EQ(shell(command).status, one.status) << "the whole one: " << command;
+        EXPECT_EQ(shell(command + " --dump-size").status, one.status) << command;
+    }
+    EXPECT_FALSE(exists("/remote/data/there/aaa"));
 }
 
 TEST_F(Programs, RsyncReachesEveryKindOfPlaceAndAsksNothing)
@@ -179,6 +228,7 @@ TEST_F(Programs, AProbeEndsWhateverGoesOnForEver)
     const std::vector<Case> cases = {
         {"rsync --port=8731 127.0.0.9::", "30\n", ""},
         {"rsync --port=8732 127.0.0.9::", "30\n", "module"},
+        {"rsync --job-name=j --port=8731 -a 127.0.0.9::m/ /tmp --dump-size --dry-run", "30\n", ""},
         {"ssh -d cm9vdHB3 root@127.0.0.1 'while echo line; do sleep 0.1; done'", "255\n", "line"},
         {"rsync -n -e 'sh -c \"setsid sleep 4711 & sleep 4711\"' x:y /tmp", "30\n", ""}};
     int number = 0;

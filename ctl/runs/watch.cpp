@@ -37,17 +37,18 @@ constexpr auto LINE_EVERY = std::chrono::seconds(5); // where lines stay
 constexpr std::size_t BAR_WIDTH = 30;
 constexpr char CLEAR_LINE[] = "\r\033[K";
 
+// What the appliance's rsync publishes of a folder's transfer.
 struct Figures {
-    std::uint64_t files;
+    std::uint64_t files; // moved
     std::uint64_t bytes;
+    std::uint64_t reached; // of the list of all files, in hundredths
+    std::uint64_t all;     // 0 while the list is not whole
 };
 
-// What bakjob and the appliance's rsync publish of a run.
 struct Progress {
     std::string folder; // empty before the first one
     std::string place;  // "2/3"
-    std::optional<Figures> total;
-    std::optional<Figures> moved;
+    std::optional<Figures> figures;
 };
 
 struct Published {
@@ -72,11 +73,11 @@ std::optional<Figures> figures_in(const Published &published)
 {
     std::istringstream text(published.text);
     Figures figures{};
-    if (text >> figures.files >> figures.bytes) return figures;
+    if (text >> figures.files >> figures.bytes >> figures.reached >> figures.all) return figures;
     return std::nullopt;
 }
 
-// Figures that are older than the folder, or than the size that its dry run found, are an earlier transfer's.
+// Figures that are older than the folder are an earlier transfer's.
 Progress read_progress(const JobName &name)
 {
     Progress progress;
@@ -85,21 +86,18 @@ Progress read_progress(const JobName &name)
     std::istringstream lines(folder->text);
     std::getline(lines, progress.folder);
     std::getline(lines, progress.place);
-    const auto total = read_published(transfer_size_file(name));
-    if (!total || total->written < folder->written) return progress;
-    progress.total = figures_in(*total);
-    const auto moved = read_published(transfer_file(name));
-    if (moved && moved->written >= total->written) progress.moved = figures_in(*moved);
+    const auto published = read_published(transfer_file(name));
+    if (published && published->written >= folder->written) progress.figures = figures_in(*published);
     return progress;
 }
 
-// Nothing while there are no figures of a transfer, or none of how much it is about.
+// Nothing while it is not known how much there is.
 std::optional<int> per_cent(const Progress &progress)
 {
-    if (!progress.moved || !progress.total) return std::nullopt;
-    if (progress.total->bytes == 0) return 100;
-    const std::uint64_t moved = std::min(progress.moved->bytes, progress.total->bytes);
-    return static_cast<int>(static_cast<double>(moved) * 100 / static_cast<double>(progress.total->bytes));
+    if (!progress.figures || progress.figures->all == 0) return std::nullopt;
+    const Figures &figures = *progress.figures;
+    return static_cast<int>(static_cast<double>(std::min(figures.reached, figures.all)) * 100 /
+                            static_cast<double>(figures.all));
 }
 
 std::string words_of(const Progress &progress)
@@ -107,21 +105,22 @@ std::string words_of(const Progress &progress)
     if (progress.folder.empty()) return "starting";
     std::string words = "folder " + progress.place + "  " + printable(progress.folder) + "  ";
     const auto share = per_cent(progress);
-    if (!share) return words + "looking what there is to do";
-    return words + format_text("%3d %%  %llu of %llu bytes", *share,
-                               static_cast<unsigned long long>(progress.moved->bytes),
-                               static_cast<unsigned long long>(progress.total->bytes));
+    words += share ? format_text("%3d %%", *share) : "looking what there is to do";
+    const auto bytes = progress.figures ? progress.figures->bytes : 0;
+    if (bytes == 0 && !share) return words;
+    return words + format_text("  %llu bytes moved", static_cast<unsigned long long>(bytes));
 }
 
 Json json_of(const Progress &progress)
 {
     Json json{{"folder", progress.folder}, {"place", progress.place}};
+    if (progress.figures) {
+        json["files"] = progress.figures->files;
+        json["bytes"] = progress.figures->bytes;
+    }
     if (const auto share = per_cent(progress)) {
         json["percent"] = *share;
-        json["bytes"] = progress.moved->bytes;
-        json["of_bytes"] = progress.total->bytes;
-        json["files"] = progress.moved->files;
-        json["of_files"] = progress.total->files;
+        json["all_files"] = progress.figures->all / 100;
     }
     return json;
 }
@@ -148,7 +147,7 @@ public:
     {
         if (terminal_) return draw(progress);
         // A line when the folder changes or its transfer begins, and now and then between.
-        const std::string step = progress.place + (progress.moved ? "t" : "l");
+        const std::string step = progress.place + (per_cent(progress) ? "t" : "l");
         const bool due = Clock::now() >= next_;
         const std::string line = json_ ? json_of(progress).dump(-1, ' ', true, Json::error_handler_t::replace)
                                        : words_of(progress);

@@ -1,11 +1,13 @@
 // rsync: the stock program, with what the appliance's own adds to it.
 //
 //   --job-name=NAME   the job that a transfer belongs to; it stays visible in the process list
-//   --dump-size       publish how far the job's transfer is (transfer_figures.h)
+//   --dump-size       publish how far the job's transfer is (transfer_figures.h); with --dry-run, try its
+//                     start alone (start_check.h)
 //
-// It never asks a question, and gives up on a far end that stays silent. A probe may not take long in all,
-// even if the far end keeps talking (stock_program.h).
+// It never asks a question, and gives up on a far end that stays silent. What moves no job's data may not
+// take long in all, even if the far end keeps talking (stock_program.h).
 
+#include "start_check.h"
 #include "stock_program.h"
 #include "transfer_figures.h"
 
@@ -103,12 +105,18 @@ int main(int argc, char **argv)
     }
     const std::string job = take_option(arguments, JOB_NAME);
     const bool dump_size = !take_option(arguments, "--dump-size").empty();
-    add_limits(arguments, !job.empty());
+    const bool start_only = dump_size && has_option(arguments, "--dry-run");
+    const bool moves_data = !job.empty() && !start_only;
+    add_limits(arguments, moves_data);
     setenv("RSYNC_RSH", REMOTE_SHELL, 1);
     setenv("RSYNC_PASSWORD", "", 0);
     arguments.insert(arguments.begin(), job.empty() ? OWN_NAME : OWN_NAME + (' ' + job));
     const std::string job_name = job.substr(std::min(JOB_NAME.size(), job.size()));
-    if (!job.empty() || has_option(arguments, "--daemon")) mark_transfer();
-    if (dump_size && has_figures(job_name)) return run_with_figures(STOCK_RSYNC, job_name, arguments);
+    if (moves_data || has_option(arguments, "--daemon")) mark_transfer();
+    if (start_only) arguments = start_check(arguments);
+    if (dump_size && has_figures(job_name)) {
+        if (!start_only) return run_with_figures(STOCK_RSYNC, job_name, arguments);
+        forget_total(job_name);
+    }
     return run_stock(STOCK_RSYNC, arguments);
 }

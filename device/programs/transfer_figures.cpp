@@ -19,36 +19,84 @@
 namespace
 {
 
+constexpr std::uint64_t MOST_LISTED = 1'500'000;
+constexpr const char *WHOLE_LIST = "--no-inc-recursive";
+constexpr const char *LIST_IN_PIECES = "--inc-recursive";
+
 struct Figures {
-    std::uint64_t files = 0;
-    std::uint64_t bytes = 0;
+    std::uint64_t files = 0; // moved whole
+    std::uint64_t bytes = 0; // of those
+    std::uint64_t bytes_of_current = 0;
+    std::uint64_t passed = 0;  // of the list
+    std::uint64_t reached = 0; // the same in hundredths, with the share of the current one
+    std::uint64_t all = 0;     // in the list; 0 while that is not known
+    std::uint64_t listed = 0;  // while the list is made
 };
 
-// The number that follows `label` in a line, if it is there.
+// The number at the start of `text`, which is moved behind it.
+std::optional<std::uint64_t> take_number(std::string_view &text)
+{
+    text.remove_prefix(std::min(text.find_first_not_of(' '), text.size()));
+    std::uint64_t number = 0;
+    const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
+    if (error != std::errc()) return std::nullopt;
+    text.remove_prefix(static_cast<std::size_t>(end - text.data()));
+    return number;
+}
+
 std::optional<std::uint64_t> number_behind(std::string_view line, std::string_view label)
 {
     const std::size_t place = line.find(label);
     if (place == std::string_view::npos) return std::nullopt;
     line.remove_prefix(place + label.size());
-    line.remove_prefix(std::min(line.find_first_not_of(' '), line.size()));
-    std::uint64_t number = 0;
-    const auto [end, error] = std::from_chars(line.data(), line.data() + line.size(), number);
-    return error == std::errc() ? std::optional(number) : std::nullopt;
+    return take_number(line);
 }
 
-// A line of "--stats".
-void take_statistics(std::string_view line, Figures &figures)
+// A line of "--info=flist2": "N files..." or, once it is whole, "N files to consider", behind other words.
+void take_list_line(std::string_view line, Figures &figures)
 {
-    figures.files = number_behind(line, "Number of regular files transferred:").value_or(figures.files);
-    figures.bytes = number_behind(line, "Total transferred file size:").value_or(figures.bytes);
+    const std::size_t unit = line.rfind(" file");
+    if (unit == std::string_view::npos) return;
+    std::string_view words = line.substr(0, unit);
+    words.remove_prefix(words.rfind(' ') + 1); // the last one, or all
+    const auto number = take_number(words);
+    if (!number) return;
+    if (line.ends_with("to consider")) figures.all = *number;
+    if (line.ends_with("...")) figures.listed = *number;
 }
 
-// A line of "--info=progress2": bytes, per cent, speed, time and, behind a whole file, "(xfr#N, ...)".
-void take_progress(std::string_view line, Figures &figures)
+// "to-chk=LEFT/ALL"; while the list grows, it is called otherwise.
+void take_place(std::string_view line, Figures &figures)
 {
-    if (line.find('%') == std::string_view::npos) return;
-    figures.bytes = number_behind(line, "").value_or(figures.bytes);
-    figures.files = number_behind(line, "xfr#").value_or(figures.files);
+    constexpr std::string_view LABEL = "to-chk=";
+    const std::size_t label = line.find(LABEL);
+    if (label == std::string_view::npos) return;
+    line.remove_prefix(label + LABEL.size());
+    const auto left = take_number(line);
+    const auto all = number_behind(line, "/");
+    if (!left || !all || *left > *all) return;
+    figures.all = *all;
+    figures.passed = *all - *left;
+}
+
+// A line of "--info=progress": bytes of a file, per cent, speed, time and, when it is whole, "(xfr#N,
+// to-chk=M/ALL)".
+void take_progress_line(std::string_view line, Figures &figures)
+{
+    const std::string_view whole = line;
+    const auto bytes = take_number(line);
+    const auto share = take_number(line);
+    if (!bytes || !share || !line.starts_with('%')) return take_list_line(whole, figures);
+    const auto files = number_behind(line, "xfr#");
+    figures.bytes_of_current = files ? 0 : *bytes;
+    if (files) {
+        figures.files = *files;
+        figures.bytes += *bytes;
+        take_place(line, figures);
+    }
+    // rsync goes back for files that changed while they were moved.
+    const std::uint64_t reached = figures.passed * 100 + (files ? 0 : *share);
+    figures.reached = std::max(figures.reached, std::min(reached, figures.all * 100));
 }
 
 // Made anew, as others may write to its folder, and then overwritten in place by lines of one length: whoever
@@ -63,22 +111,49 @@ public:
             bakjob::UniqueFd(open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0644));
     }
 
-    void write(const Figures &figures) const
+    void write(const std::string &text) const
     {
-        std::array<char, 64> line{};
-        const int length = std::snprintf(line.data(), line.size(), "%20llu %20llu\n",
-                                         static_cast<unsigned long long>(figures.files),
-                                         static_cast<unsigned long long>(figures.bytes));
-        if (pwrite(fd_.get(), line.data(), static_cast<std::size_t>(length), 0) < 0)
-            return; // tries again soon
+        if (pwrite(fd_.get(), text.data(), text.size(), 0) < 0) return; // tries again soon
     }
 
 private:
     bakjob::UniqueFd fd_;
 };
 
+std::string line_of(std::uint64_t first, std::uint64_t second)
+{
+    std::array<char, 64> line{};
+    const int length =
+        std::snprintf(line.data(), line.size(), "%20llu %20llu\n", static_cast<unsigned long long>(first),
+                      static_cast<unsigned long long>(second));
+    return {line.data(), static_cast<std::size_t>(length)};
+}
+
+std::string moved_line(const Figures &figures)
+{
+    return line_of(figures.files, figures.bytes + figures.bytes_of_current);
+}
+
+// In hundredths of a file, so that a large one does not seem to stand still.
+std::string reached_line(const Figures &figures)
+{
+    return line_of(figures.reached, figures.all * 100);
+}
+
+std::string total_path(const std::string &job_name)
+{
+    return "/tmp/r_" + job_name + ".dump_size";
+}
+
+std::uint64_t most_listed()
+{
+    const char *const text = std::getenv("DEVICE_MOST_LISTED");
+    const std::uint64_t most = text == nullptr ? 0 : std::strtoull(text, nullptr, 10);
+    return most > 0 ? most : MOST_LISTED;
+}
+
 // The figures are what stands in the output that a job's "-q" would suppress.
-void make_talk(std::vector<std::string> &arguments, bool dry_run)
+void make_talk(std::vector<std::string> &arguments)
 {
     std::erase(arguments, "-q");
     for (std::string &argument : arguments) {
@@ -86,8 +161,7 @@ void make_talk(std::vector<std::string> &arguments, bool dry_run)
         const std::size_t q = letters ? argument.find('q') : std::string::npos;
         if (q < argument.find_first_of("efBTM@")) argument.erase(q, 1); // letters that take what follows
     }
-    const char *const output = dry_run ? "--stats" : "--info=progress2";
-    arguments.insert(arguments.begin() + 1, {"--no-human-readable", output});
+    arguments.insert(arguments.begin() + 1, {"--no-human-readable", "--info=flist2,progress"});
 }
 
 // Reads until the end of the output; every call of `take` gets a line.
@@ -115,35 +189,69 @@ void read_lines(int fd, const Take &take, const Pause &pause)
     std::exit(become_stock(rsync, arguments));
 }
 
-} // namespace
-
-int run_with_figures(const StockProgram &rsync, const std::string &job_name,
-                     std::vector<std::string> arguments)
+int wait_for(pid_t child)
 {
-    const bool dry_run = std::count(arguments.begin(), arguments.end(), "--dry-run") > 0;
-    make_talk(arguments, dry_run);
+    int status = 0;
+    if (waitpid(child, &status, 0) != child) return EXIT_FAILURE;
+    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+}
+
+// Its exit status; nothing when its list was becoming too long. It has moved nothing then.
+std::optional<int> run_once(const StockProgram &rsync, const std::vector<std::string> &arguments,
+                            std::uint64_t most, Figures &figures, const FiguresFile &file)
+{
     std::array<int, 2> ends{};
     if (pipe2(ends.data(), O_CLOEXEC) < 0) return become_stock(rsync, arguments);
     const pid_t child = fork();
     if (child < 0) return become_stock(rsync, arguments);
     if (child == 0) become_child(rsync, arguments, ends[1]);
     close(ends[1]);
+    const bakjob::UniqueFd output(ends[0]);
 
-    const std::string path = "/tmp/r_" + job_name;
+    bool stopped = false;
+    const auto publish = [&] {
+        if (figures.listed <= most || stopped) return file.write(moved_line(figures) + reached_line(figures));
+        std::fprintf(stderr, "%s: more than %llu files: starts anew without listing all of them first\n",
+                     rsync.name, static_cast<unsigned long long>(most));
+        stopped = kill(child, SIGTERM) == 0;
+    };
+    read_lines(
+        output.get(), [&](std::string_view line) { take_progress_line(line, figures); }, publish);
+    const int status = wait_for(child);
+    return stopped ? std::nullopt : std::optional(status);
+}
+
+bool went_to_its_end(int status)
+{
+    constexpr std::array CODES = {0, 23, 24, 25}; // done, but for some files or deletions
+    return std::find(CODES.begin(), CODES.end(), status) != CODES.end();
+}
+
+} // namespace
+
+void forget_total(const std::string &job_name)
+{
+    std::remove(total_path(job_name).c_str());
+}
+
+int run_with_figures(const StockProgram &rsync, const std::string &job_name,
+                     std::vector<std::string> arguments)
+{
+    forget_total(job_name);
+    make_talk(arguments);
+    arguments.insert(arguments.begin() + 1, WHOLE_LIST);
+    const FiguresFile file("/tmp/r_" + job_name);
     Figures figures;
-    if (dry_run) {
-        read_lines(
-            ends[0], [&](std::string_view line) { take_statistics(line, figures); }, [] {});
-        FiguresFile(path + ".dump_size").write(figures);
-    } else {
-        const FiguresFile file(path);
-        const auto publish = [&] { file.write(figures); };
-        read_lines(
-            ends[0], [&](std::string_view line) { take_progress(line, figures); }, publish);
-        publish();
+    std::optional<int> status = run_once(rsync, arguments, most_listed(), figures, file);
+    if (!status) {
+        arguments[1] = LIST_IN_PIECES;
+        figures = Figures();
+        status = run_once(rsync, arguments, UINT64_MAX, figures, file);
     }
-
-    int status = 0;
-    if (waitpid(child, &status, 0) != child) return EXIT_FAILURE;
-    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+    if (went_to_its_end(*status)) {
+        figures.reached = figures.all * 100;
+        file.write(moved_line(figures) + reached_line(figures));
+        FiguresFile(total_path(job_name)).write(moved_line(figures));
+    }
+    return *status;
 }
