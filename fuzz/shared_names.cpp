@@ -13,7 +13,7 @@ namespace
 {
 
 constexpr std::string_view BLANKS = " \t\n\v\f\r";
-constexpr std::size_t MOST_NAME = 63;
+constexpr std::size_t MAX_NAME = 63;
 
 void check_words(std::string_view text)
 {
@@ -30,7 +30,7 @@ void check_words(std::string_view text)
 
 bool is_name(std::string_view name)
 {
-    return name.size() <= MOST_NAME && name.find_first_of(BLANKS) == std::string_view::npos;
+    return name.size() <= MAX_NAME && name.find_first_of(BLANKS) == std::string_view::npos;
 }
 
 } // namespace

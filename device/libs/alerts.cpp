@@ -1,4 +1,5 @@
 #include "common/handles.h"
+#include "common/text.h"
 #include "platform/device.h"
 
 #include <algorithm>
@@ -15,11 +16,6 @@ namespace
 
 constexpr const char *ALERT_FILE = "/var/log/device_alerts";
 
-bool is_control(unsigned char c)
-{
-    return c < 0x20 || c == 0x7f;
-}
-
 // One write, so that lines of processes that raise alerts at the same time do not mix.
 bool append(const std::string &line)
 {
@@ -34,7 +30,7 @@ int fireAlert(int level, int code, const char *text)
 {
     if (!text) return -1;
     std::string alert = std::to_string(level) + ' ' + std::to_string(code) + ' ' + text;
-    std::replace_if(alert.begin(), alert.end(), is_control, '?');
+    std::replace_if(alert.begin(), alert.end(), bakjob::is_control, '?');
     syslog(LOG_WARNING, "%s", alert.c_str());
     if (append(alert + '\n')) return 0;
     std::fprintf(stderr, "alerts: cannot write %s: %s\n", ALERT_FILE, std::strerror(errno));

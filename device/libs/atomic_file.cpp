@@ -39,7 +39,7 @@ std::string name_of(const std::string &path)
     return path.substr(path.rfind('/') + 1);
 }
 
-// The process that a temporary with this start of its name belongs to; 0 when it is no such temporary.
+// The process that a temporary file whose name has this start belongs to; 0 for another file.
 pid_t owner_of(std::string_view name, std::string_view start)
 {
     if (!name.starts_with(start)) return 0;
@@ -63,7 +63,7 @@ void remove_leftovers(const std::string &folder, const std::string &start)
 bool sync_folder(const std::string &folder)
 {
     const UniqueFd fd(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    return fd && (fsync(fd.get()) == 0 || errno == EINVAL); // EINVAL: its file system has no such thing
+    return fd && (fsync(fd.get()) == 0 || errno == EINVAL); // EINVAL: this file system cannot sync folders
 }
 
 } // namespace

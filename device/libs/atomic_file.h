@@ -18,15 +18,15 @@ struct FileOwner {
 };
 
 struct Replaced {
-    bakjob::UniqueFd file; // the new one, open; none: it failed (errno) and the old file is as it was
+    bakjob::UniqueFd file; // the new file, open; empty: that failed (errno) and the old file is as it was
     bool on_disk = false;  // false with a file: its folder could not be synced (errno)
 };
 
-// Puts a file with these contents in the place of `path`, with the new one written to disk before the old one
-// goes. Temporaries that processes which died left beside `path` are removed.
+// Replaces the file at `path`. The new one is on disk before the old one goes. Temporary files that dead
+// processes left beside `path` are removed.
 Replaced replace_file(const std::string &path, std::string_view contents, const FileOwner &owner);
 
-// Reads an open file from where it stands to its end. False on failure, with errno telling why.
+// Reads an open file from its present position to its end. False (errno) on failure.
 bool read_whole(int fd, std::string &contents);
 
 } // namespace device

@@ -1,13 +1,12 @@
 // The configuration store: the tree of one XML file, whose root element is <config>.
 //
-// Other processes write the file too. As long as this process has no unsaved change of its own, the file is
-// looked at before a change, and before a read of a path without a numbered step, and read again when it is
-// another one. Reads through a numbered step, "item:3/name", take the tree as it is: whoever walks a list has
-// read its count before, and must see the whole walk in one tree.
+// Other processes write the file, too. While this process has no unsaved change, the file is checked before a
+// change, and before a read of a path without a numbered step, and is read again when it is a new one. Reads
+// through a numbered step, "item:3/name", use the tree as it is: a walk through a list begins with its count,
+// and must see one tree to its end.
 //
-// Nor may what was read from one tree be changed in another. So a list that was read before the file changed,
-// and is another one now, takes no change until it has been read anew, and the file is written only in the
-// place of the one that was read.
+// What was read from one tree must not be changed in another. So a list that was read, and has changed since
+// in the file, takes no change until it is read again, and a write replaces only the file that was read.
 
 #include "platform/config_store.h"
 
@@ -26,10 +25,8 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <map>
 #include <new>
 #include <pugixml.hpp>
-#include <set>
 
 using pugi::xml_node;
 
@@ -73,7 +70,7 @@ void complain(const FileVersion &version, const char *why)
     std::fprintf(stderr, "config store: %s: %s\n", STORE_FILE, why);
 }
 
-// Null, or why the tree is not to be used.
+// Null, or why the tree cannot be used.
 const char *load()
 {
     Store &s = store();
@@ -87,53 +84,10 @@ const char *load()
     }
 }
 
-xml_node plain_child(xml_node parent, std::string_view name)
-{
-    for (const xml_node child : parent.children()) {
-        if (child.type() == pugi::node_element && child.name() == name) return child;
-    }
-    return {};
-}
-
-std::string text_of_list(const std::string &list)
-{
-    xml_node node = store().document.document_element();
-    const StorePath path = parse_store_path(list);
-    for (const Step &step : path.used()) {
-        node = plain_child(node, step.name);
-    }
-    return raw_text_of(node);
-}
-
-using ListTexts = std::map<std::string, std::string>;
-
-ListTexts texts_of_current_lists()
-{
-    ListTexts texts;
-    for (const std::string &list : store().lists.current()) {
-        texts[list] = text_of_list(list);
-    }
-    return texts;
-}
-
-// Those that the tree has as they were. Without memory to compare them, fewer.
-std::set<std::string> unchanged(const ListTexts &texts)
-{
-    std::set<std::string> same;
-    try {
-        for (const auto &[list, text] : texts) {
-            if (text_of_list(list) == text) same.insert(list);
-        }
-    } catch (const std::bad_alloc &) {
-        return same;
-    }
-    return same;
-}
-
 void read_file()
 {
     Store &s = store();
-    const ListTexts before = texts_of_current_lists();
+    const ListTexts before = texts_of(s.lists.current(), s.document.document_element());
     s.forget_nodes();
     s.document.reset();
     s.unsaved = s.broken = false;
@@ -143,7 +97,7 @@ void read_file()
         complain(s.file.version, why);
         s.document.reset();
     }
-    const auto same = unchanged(before);
+    const auto same = unchanged(before, s.document.document_element());
     s.lists.tree_changed([&](const std::string &list) { return same.contains(list); });
 }
 
@@ -167,7 +121,7 @@ bool takes_change(const char *path)
     return s.state == Store::State::GOOD && !s.broken && !s.lists.outdated(path);
 }
 
-// The node of a path, made when missing if `create` says so. Null when there is none.
+// The node of a path, created when missing if `create` says so; else null.
 xml_node resolve(const StorePath &path, bool create)
 {
     Store &s = store();
@@ -220,7 +174,7 @@ xml_node find_or_make(const char *path_text)
     return resolve(parse_store_path(path_text), true);
 }
 
-// One that fails half way, or for want of memory, spoils the tree.
+// A change that fails half way, or without memory, spoils the tree.
 template <class Change>
 int change(const Change &make)
 {
@@ -236,8 +190,8 @@ int change(const Change &make)
     }
 }
 
-// When the store's own file cannot be written, the changes that were meant for it go: kept, they would
-// overwrite with a later success what others wrote in the meantime.
+// When the store's own file cannot be written, its unsaved changes are dropped: a later write would put them
+// over what others have written meanwhile.
 const char *write_own_file()
 {
     Store &s = store();

@@ -1,7 +1,7 @@
 #pragma once
 
-// Shortcuts for walks through the lists of the store: they remember where the latest look-ups ended and go on
-// from there.
+// Shortcuts for walks through the lists of the store: they remember where the latest look-ups ended and
+// continue from there.
 
 #include <array>
 #include <pugixml.hpp>
@@ -19,7 +19,7 @@ public:
     // new one after as many others as it takes.
     pugi::xml_node numbered_child(pugi::xml_node parent, std::string_view name, int index, bool create);
 
-    // To be called whenever nodes go.
+    // To be called when nodes are removed.
     void forget() { cursors_ = {}; }
 
 private:
@@ -37,9 +37,8 @@ private:
     unsigned long uses_ = 0;
 };
 
-// Finds the keys of the record that was looked up last: whoever asks for one key of a record mostly asks for
-// the others next, and in the order they stand in. So neither is the record's path taken apart again, nor are
-// the keys searched from the first.
+// Finds the keys of the record that was looked up last. Callers mostly ask for all keys of a record, in their
+// order, so the record's path is not parsed again, and the search begins behind the key found last.
 class RecordCursor
 {
 public:
@@ -52,7 +51,7 @@ public:
     // The record's child of that name; with `create` a new one when there is none.
     pugi::xml_node key(const char *name, bool create);
 
-    // To be called whenever nodes go.
+    // To be called when nodes are removed.
     void forget() { record_ = {}; }
 
 private:

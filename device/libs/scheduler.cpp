@@ -1,6 +1,7 @@
 #include "platform/scheduler.h"
 
 #include "atomic_file.h"
+#include "common/text.h"
 #include "platform/config_store.h"
 #include "store.h"
 #include "store_path.h"
@@ -89,8 +90,7 @@ bool list_group(const char *group)
 
 bool has_control_character(std::string_view text)
 {
-    return std::any_of(text.begin(), text.end(),
-                       [](unsigned char c) { return (c < 0x20 && c != '\t') || c == 0x7f; });
+    return std::any_of(text.begin(), text.end(), [](char c) { return bakjob::is_control(c) && c != '\t'; });
 }
 
 // Whether cron would read the line as the entry means it.
@@ -122,7 +122,7 @@ std::string cron_lines(const std::string &group)
     std::string lines;
     const std::string path = group_path(group);
     const int count = count_of(path);
-    // Behind an entry that is not there is none, whatever the count says.
+    // The first missing entry ends the list, whatever the count says.
     for (int number = 1; number <= count && store_text(item_path(path, number)); ++number) {
         Entry entry;
         for (std::size_t i = 0; i < KEYS.size(); ++i) {
@@ -150,7 +150,7 @@ int LIB_create_xml(const char *minute, const char *hour, const char *day, const 
     if (std::count(values.begin(), values.end(), nullptr) > 0 || !group || !is_group_name(group)) return -1;
     const std::string path = group_path(group);
     const int number = count_of(path) + 1;
-    // Behind a count that is too low stands something that the new one would replace.
+    // With a count that is too low, the new entry would replace an existing one.
     if (store_text(item_path(path, number))) return -1;
     if (place_of(group) == 0 && store_text(listed_name(count_of(GROUP_LIST) + 1))) return -1;
     for (std::size_t i = 0; i < KEYS.size(); ++i) {

@@ -46,7 +46,7 @@ void put_text(Bytes &bytes, std::size_t offset, const std::string &text)
     text.copy(bytes.data() + offset, text.size());
 }
 
-// Nothing when the record cannot hold the share, or there is none of that number.
+// Nullopt when there is no share of that number, or the record cannot hold it.
 std::optional<Bytes> read_share(int number)
 {
     const std::string item = SHARES + "/item:" + std::to_string(number);

@@ -27,7 +27,7 @@ FileVersion version_of(const struct stat &status)
     return {0, status.st_dev, status.st_ino, status.st_size, status.st_mtim.tv_sec, status.st_mtim.tv_nsec};
 }
 
-// An empty tree in the place of a lost one would be written, and then copied over the last good one.
+// An empty tree in place of a lost one would be saved, and then copied over the last good copy.
 const char *reason_of_missing_file()
 {
     struct stat status = {};
@@ -46,8 +46,7 @@ const char *reason_of_missing_file()
            "written over either. Mend one, or move the copy away to begin anew";
 }
 
-// The file behind the store's name, which may be a link, and what is kept of it: never more than the owner
-// may read it.
+// The file behind the store's name, which may be a link, and its owner and mode: only the owner may read it.
 struct Target {
     std::string path = STORE_FILE;
     FileOwner owner{.mode = STORE_MODE};
@@ -76,7 +75,7 @@ FileVersion current_version()
 const char *read_store_file(StoreFile &opened, std::string &text)
 {
     constexpr int ANY_TIME = -1;
-    // A fifo in its place must not make us wait.
+    // Do not wait for a fifo of that name.
     opened.file = UniqueFd(open(STORE_FILE, O_RDONLY | O_CLOEXEC | O_NONBLOCK));
     opened.version = {.error = ANY_TIME};
     if (!opened.file) {
@@ -90,7 +89,7 @@ const char *read_store_file(StoreFile &opened, std::string &text)
     if (fstat(file, &before) < 0) return std::strerror(errno);
     if (!S_ISREG(before.st_mode)) return "not a regular file";
     if (!read_whole(file, text) || fstat(file, &after) < 0) return std::strerror(errno);
-    // Whoever writes in place is seen by the file's time or size.
+    // A change in place shows in the file's time or size.
     if (version_of(before) != version_of(after)) return "somebody writes into it";
     opened.version = version_of(before);
     return nullptr;

@@ -31,7 +31,7 @@ struct StorePath {
 // What may stand in an element's name. Anything else would make the file unreadable.
 bool is_node_name(std::string_view name);
 
-// Never fails otherwise than by a depth of 0. The steps are views into `text`.
+// A depth of 0 is the only failure. The steps are views into `text`.
 StorePath parse_store_path(std::string_view text);
 
 } // namespace device

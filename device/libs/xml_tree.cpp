@@ -98,6 +98,14 @@ bool set_value(xml_node node, const char *text)
     return true;
 }
 
+xml_node plain_child(xml_node parent, std::string_view name)
+{
+    for (const xml_node child : parent.children()) {
+        if (child.type() == pugi::node_element && child.name() == name) return child;
+    }
+    return {};
+}
+
 xml_node append_element(xml_node parent, const char *name)
 {
     xml_node child = parent.append_child(pugi::node_element);
