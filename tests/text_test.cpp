@@ -2,6 +2,7 @@
 #include "common/text.h"
 #include "support.h"
 
+#include <climits>
 #include <cstring>
 
 using namespace bakjob;
@@ -51,6 +52,16 @@ TEST(Text, TrimsBlanksAndControlCharactersAtTheEndOnly)
         trim_right(buffer);
         EXPECT_EQ(buffer, trimmed);
     }
+}
+
+TEST(Text, ANumberIsTheWholeText)
+{
+    for (const char *none : {"", " 1", "1 ", "+1", "1x", "-", "2147483648", "1.5"}) {
+        EXPECT_FALSE(whole_number<int>(none)) << none;
+    }
+    EXPECT_EQ(whole_number<int>("-2147483648"), INT_MIN);
+    EXPECT_EQ(whole_number("10", 3, 10), 10);
+    EXPECT_FALSE(whole_number("11", 3, 10) || whole_number("2", 3, 10));
 }
 
 TEST(Password, FitsItsFieldUpTo93Characters)

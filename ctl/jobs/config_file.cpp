@@ -15,7 +15,7 @@ namespace bakjob::ctl
 namespace
 {
 
-// Where a link of that name leads.
+// The target, when that name is a link.
 std::filesystem::path config_path()
 {
     std::error_code error;
@@ -39,7 +39,7 @@ std::string why_not_writable()
     struct stat file = {};
     struct statvfs disk = {};
     const std::uint64_t size = stat(path.c_str(), &file) == 0 ? static_cast<std::uint64_t>(file.st_size) : 0;
-    // A state that was not there before makes it a little longer.
+    // A new state makes it a little longer.
     constexpr std::uint64_t MORE = 4096;
     if (statvfs(folder.c_str(), &disk) != 0) return folder + ": " + std::strerror(errno);
     return has_room_for(size + MORE, disk) ? "" : folder + ": no room for another copy of the file";

@@ -1,14 +1,14 @@
 #pragma once
 
-// The configuration file, as far as people must look after it.
+// Whether the configuration file can be replaced.
 
 #include <string>
 
 namespace bakjob::ctl
 {
 
-// Why the next change of the configuration would fail, in words; empty when it would not. Each is written as
-// a new file beside the old one.
+// Why the next change of the configuration would fail, in words; empty when it would not. A change writes a
+// new file beside the old one.
 std::string why_not_writable();
 
 } // namespace bakjob::ctl

@@ -1,4 +1,4 @@
-// add, set, delete, enable, disable, schedule, unschedule: whatever changes the configuration.
+// add, set, delete, enable, disable, schedule, unschedule: the commands that change the configuration.
 
 #include "common/job_files.h"
 #include "common/shell_text.h"
@@ -46,15 +46,15 @@ int set_enable(const Request &request, int enable)
     return EXIT_FINE;
 }
 
-// One at a time, or the last to write may be one who read before the others' saves.
+// Under the lock, or a process that has read before the others' saves may be the last to write.
 bool hand_over()
 {
     const UniqueFd lock = rsync_lock_config(CONFIG_LOCK_FILE);
     return lock && rsync_apply_schedule() == 1;
 }
 
-// A change of a job that changes its timetable, too: saved at once, and then handed over to the scheduler.
-// Whether that took it.
+// Changes a job and its timetable, saves, and hands the timetable over to the scheduler. Whether that took
+// it.
 bool change_timetable(const std::string &name,
                       const std::function<void(RsyncJobList &jobs, RsyncJob &job)> &change)
 {
@@ -67,17 +67,18 @@ bool change_timetable(const std::string &name,
     } catch (const Failure &failure) {
         // Saved or not: the scheduler goes by what the file says now.
         if (!changed || hand_over()) throw;
-        throw Failure(std::string(failure.what()) + "; and the scheduler did not take over what it says");
+        throw Failure(std::string(failure.what()) +
+                      "; and the scheduler did not take over the timetables that it has");
     }
     return hand_over();
 }
 
-// What a job left where its next run would look: passwords among it. Copies and snapshots are people's.
+// The files of its runs, some with passwords. Copies and snapshots stay: they belong to people.
 void remove_files_of(const std::string &name)
 {
     const auto job = JobName::checked(name);
-    if (!job) return;                          // no run can have had it
-    if (run_of(name) == Run::GOING_ON) return; // of a job that was added meanwhile
+    if (!job) return;                          // no run can have the name
+    if (run_of(name) == Run::GOING_ON) return; // the job was added again meanwhile
     for (const std::string &path :
          {password_file(*job), progress_file(*job), transfer_file(*job), transfer_size_file(*job),
           remote_config_copy(*job), unrecorded_file(*job)}) {
@@ -85,8 +86,8 @@ void remove_files_of(const std::string &name)
     }
 }
 
-// The scheduler's rule is that an entry holds the job's name in single quotes. A name that has one itself is
-// written for the shell first, and then, behind what starts a comment, as the rule wants it.
+// The scheduler finds a job's entries by the job's name in single quotes. A name that has such a quote itself
+// is written for the shell first, and then in a comment as the scheduler looks for it.
 std::string run_command(const std::string &name)
 {
     const std::string quoted = in_single_quotes(name);
@@ -143,7 +144,7 @@ int delete_job(const Request &request)
     remove_files_of(request.name);
     if (!taken_over) {
         throw Failure("the job is deleted, but the scheduler did not take that over and goes on starting "
-                      "runs, which are refused; bakjobctl schedule of any other job hands that over, too");
+                      "runs, which are refused; bakjobctl schedule of any other job ends that");
     }
     return EXIT_FINE;
 }
@@ -167,14 +168,14 @@ int schedule_job(const Request &request)
     const bool taken_over = change_timetable(request.name, [&](RsyncJobList &jobs, RsyncJob &job) {
         rsync_unschedule_job(jobs, request.name);
         if (!rsync_add_schedule(entry)) {
-            throw Failure("the configuration does not take the entry: there are too many, or more than their "
+            throw Failure("the configuration cannot take the entry: there are too many, or more than their "
                           "count says; nothing is changed");
         }
         job.schedule_mode = SCHEDULE_TIMETABLE;
     });
     if (!taken_over) {
         throw Failure("the timetable is in the configuration, but the scheduler did not take it over, so "
-                      "nothing runs by it yet; the same command again hands it over");
+                      "nothing runs by it yet; run the same command again");
     }
     return EXIT_FINE;
 }
@@ -189,7 +190,7 @@ int unschedule_job(const Request &request)
     });
     if (!taken_over) {
         throw Failure("the timetable is no longer in the configuration, but the scheduler did not take that "
-                      "over and goes on running by it; the same command again hands it over");
+                      "over and goes on starting runs by it; run the same command again");
     }
     return EXIT_FINE;
 }

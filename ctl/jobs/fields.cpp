@@ -24,7 +24,7 @@ bool is_host(std::string_view text)
     return !text.empty() && !refusal_of_host(text);
 }
 
-// A run takes blanks behind the number.
+// A run accepts blanks behind the number.
 bool is_port(std::string_view text)
 {
     return whole_number(text.substr(0, text.find_last_not_of(' ') + 1), 1, MAX_PORT).has_value();
@@ -181,7 +181,7 @@ Setting parse_setting(const std::string &text, const std::function<std::string(c
 
 void set_password(RsyncJob &job, const JobField &field, const std::string &value)
 {
-    // A plain password goes into base64 with the next load, but that of no ssh job is never looked at.
+    // The next load encodes plain passwords, but not the ssh password of a job without ssh.
     const bool stays_plain =
         job.pwd_encoded == 0 && !(job.use_ssh != 1 && field.key == std::string("ssh_pwd"));
     if (stays_plain || value.empty()) {

@@ -56,7 +56,7 @@ std::string shown_value(const RsyncJob &job, const JobField &field);
 
 bool is_secret(const JobField &field);
 
-// Why a field's value could not be set so, empty when it could. Secrets are not looked at.
+// Why bakjobctl would refuse to set this value; empty when it would not. Secrets are not checked.
 std::string refusal_of(const RsyncJob &job, const JobField &field);
 
 // The word of a number; empty when it has none.

@@ -20,7 +20,7 @@ namespace
 
 [[noreturn]] void no_such_job(const std::string &name)
 {
-    throw Failure("there is no job \"" + name + "\"; bakjobctl list shows those that there are");
+    throw Failure("there is no job \"" + name + "\"; bakjobctl list shows the jobs");
 }
 
 } // namespace

@@ -26,8 +26,8 @@ std::vector<StoredJob> read_jobs();
 StoredJob read_job(const std::string &name);
 
 // Runs `change` on the loaded job list under the configuration lock, saves, and copies the configuration to
-// flash. Nothing is saved when `change` throws; Failure when the lock cannot be had, or the save or the copy
-// fails.
+// flash. Nothing is saved when `change` throws. Failure without the lock, when a job may be missing from the
+// list, and when the save or the copy fails.
 void change_jobs(const std::function<void(RsyncJobList &jobs)> &change);
 
 // The same for one job.

@@ -9,13 +9,13 @@
 namespace bakjob::ctl
 {
 
-// Where the two differ about a job, in cron's lines.
+// How the two differ about a job, in cron's lines.
 struct ScheduleDifference {
     std::vector<std::string> missing;   // in the configuration alone: cron does not run them
-    std::vector<std::string> left_over; // with cron alone
+    std::vector<std::string> left_over; // in cron's file alone
 };
 
-// Nothing on a device that has no folder for cron's files.
+// Nullopt on a device without a folder for cron's files.
 std::optional<ScheduleDifference> schedule_difference(const std::string &job_name);
 
 } // namespace bakjob::ctl

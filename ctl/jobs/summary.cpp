@@ -22,7 +22,7 @@ std::string words_of(const Standing &standing)
     return words_of_state(standing.state).words + note_on(standing);
 }
 
-// A state that claims a run is only believed when there is one.
+// A running state counts only while a run is going on.
 void judge(Summary &summary, const Standing &standing)
 {
     summary.last = words_of(standing);

@@ -1,6 +1,6 @@
 #pragma once
 
-// Where a job stands, in short: what list, show, status and watch tell.
+// Where a job stands, in short: what list, show, status and watch print.
 
 #include "config/unrecorded_state.h"
 #include "jobs/jobs.h"
@@ -21,8 +21,8 @@ enum class Run {
 
 Run run_of(const std::string &name);
 
-// How the backup or the restore of a job stands: as recorded, or else as the module has kept it where the
-// configuration could not be written.
+// The state of a job's backup or restore: as recorded in the configuration, or as the module has kept it when
+// that could not be written.
 struct Standing {
     std::int32_t state;
     std::string time;

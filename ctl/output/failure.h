@@ -1,6 +1,6 @@
 #pragma once
 
-// How a command ends that could not be carried out: by an exception whose text goes to standard error.
+// A command that cannot be carried out throws a Failure, whose text goes to standard error.
 
 #include <stdexcept>
 

@@ -3,7 +3,7 @@
 namespace bakjob::ctl
 {
 
-// While this lives, a signal that ends the program first has the action done, which must be safe in a signal
+// While this lives, a signal that ends the program runs the action first, which must be safe in a signal
 // handler. One at a time.
 class OnSignal
 {

@@ -21,7 +21,7 @@ void restore_terminal()
     tcsetattr(STDIN_FILENO, TCSAFLUSH, &usual_terminal);
 }
 
-// A terminal that shows nothing for as long as this lives, and cannot be left by a stop.
+// While this lives, the terminal shows nothing that is typed, and Ctrl-Z does not stop the program.
 class SilentTerminal
 {
 public:

@@ -1,6 +1,6 @@
 #pragma once
 
-// Passwords, from where nobody else sees them.
+// Passwords, read so that nobody else sees them.
 
 #include <string>
 

@@ -30,7 +30,7 @@ struct Advice {
 // Of a probe of the rsync daemon.
 Advice advice_of_reply(RemoteReplyCode code);
 
-// Of an ssh login; nothing: the host's key has changed.
+// Of an ssh login; nullopt: the host's key has changed.
 Advice advice_of_login(std::optional<SshTestResult> result);
 
 } // namespace bakjob::ctl

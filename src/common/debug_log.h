@@ -6,8 +6,8 @@
 namespace bakjob
 {
 
-// printf for the trace; the caller supplies the line end. To TRACE_FILE a message goes cut at 1023 bytes, and
-// the first message of a process starts the file anew.
+// printf for the trace; the caller supplies the line end. In TRACE_FILE a message is cut at 1023 bytes, and
+// the first message of a process replaces the file.
 [[gnu::format(printf, 1, 2)]] void DebugLog(const char *format, ...);
 
 } // namespace bakjob

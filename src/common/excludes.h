@@ -1,6 +1,6 @@
 #pragma once
 
-// What never belongs to a backup: what the appliance and its clients keep for themselves.
+// Names that no backup includes: files of the appliance's own and of its clients.
 
 #include <string>
 

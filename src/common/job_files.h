@@ -26,7 +26,7 @@ std::string pid_file(const JobName &job);
 std::string password_file(const JobName &job);
 std::string progress_file(const JobName &job);
 
-// How a job stands where the configuration could not be written (config/unrecorded_state.h).
+// A job's state that could not be written into the configuration (config/unrecorded_state.h).
 std::string unrecorded_file(const JobName &job);
 
 // Written by the appliance's rsync: what a transfer has moved, and the sizes that its dry run found.

@@ -3,9 +3,9 @@
 namespace bakjob
 {
 
-// What a program does first, for it may have been started by anybody, with anything closed or ignored: opens
-// standard handles that are closed, so that no file opened later becomes one of them, and has the exit codes
-// of its commands kept for it.
+// What a program does first, as its caller may have closed or ignored anything: opens standard handles that
+// are closed, so that no file opened later becomes one of them, and no longer ignores the end of its
+// commands, so that it gets their exit codes.
 void rsync_prepare_process();
 
 } // namespace bakjob

@@ -17,8 +17,7 @@ struct Process {
     bool operator==(const Process &other) const { return id == other.id && started == other.started; }
 };
 
-// Every process that has not ended: one that only waits for its parent to notice has. Throws
-// std::system_error when it cannot look.
+// Every process that has not ended; a zombie has. Throws std::system_error when /proc cannot be read.
 std::vector<Process> running_processes();
 
 bool is_running(pid_t process);

@@ -62,7 +62,7 @@ private:
 };
 
 // The first line of the command's output without trailing white space; the rest is read and thrown away, so
-// the command always runs to its end. Nothing when it could not be started.
+// the command always runs to its end. Nullopt when it could not be started.
 std::optional<std::string> first_line(const std::string &command);
 
 // The same, of a long line only the first 1023 bytes: what probes are judged by.

@@ -26,7 +26,7 @@ namespace
 using std::chrono::milliseconds;
 
 constexpr mode_t LOCK_MODE = 0600;
-constexpr int MAX_TRIES = 1000; // against somebody who puts something there again and again
+constexpr int MAX_TRIES = 1000; // while somebody keeps putting something there
 constexpr milliseconds BETWEEN_LOOKS(5);
 constexpr milliseconds UNTOLD_WAIT(1000);
 constexpr milliseconds LINKED_WAIT(5000); // longer than a save and its way to flash
@@ -56,8 +56,8 @@ bool flock_within(milliseconds &patience, int file)
 
 enum class Wait { TAKEN, NEIGHBOUR, FAILED };
 
-// Until the lock is taken, or turns out to be held by another user, who could open the file before it got its
-// mode. He may hold it for ever.
+// Waits until the lock is taken, or turns out to be held by another user, who opened the file before it got
+// its mode. That user may hold it for ever.
 Wait wait_for_flock(const char *path, int file)
 {
     bool told = false;
@@ -85,8 +85,8 @@ UniqueFd open_lock(const char *path)
     return file;
 }
 
-// Held while something is moved aside: two who do that at once would move away each other's new lock. It
-// lies where nobody else can write, and from the first time on it is there.
+// Held while something is moved aside: two processes that do that at once would move each other's new lock
+// away. It lies where no other user can write, and stays there from the first time on.
 UniqueFd take_guard(bool make)
 {
     UniqueFd guard = make ? create_file(LOCK_GUARD_FILE, LOCK_MODE) : UniqueFd();
@@ -95,9 +95,9 @@ UniqueFd take_guard(bool make)
     return guard;
 }
 
-// A file of this user's with more names than one is either the lock, to which somebody gave another name, or
-// another file that he linked here. An honest holder is waited for, but a neighbour or a daemon may hold it
-// for ever. Its mode stays: it may be that of /etc/passwd.
+// A file of this user's with several names is the lock, with a second name that somebody gave it, or another
+// file that somebody linked here. An honest holder is waited for, but not for long: a neighbour or a daemon
+// may hold it for ever. Its mode stays, as it may be /etc/passwd.
 UniqueFd wait_for_linked(const char *path, milliseconds &patience)
 {
     UniqueFd file(open(path, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
@@ -105,7 +105,7 @@ UniqueFd wait_for_linked(const char *path, milliseconds &patience)
     return file;
 }
 
-// What others put there stays theirs, at a name that they cannot have taken beforehand.
+// What others put there is kept, under a name that they cannot guess.
 bool move_aside(const char *path)
 {
     const auto now = std::chrono::steady_clock::now().time_since_epoch().count();
@@ -114,9 +114,8 @@ bool move_aside(const char *path)
     return renameat2(AT_FDCWD, path, AT_FDCWD, aside.c_str(), RENAME_NOREPLACE) == 0;
 }
 
-// The file that is made is a lock for the one who made it, even if somebody gives it another name at once:
-// whoever moves it aside for that waits for the lock first.
-// A lock that a neighbour holds, if one is given, is in the way, too.
+// A new file is a lock for its creator even when somebody gives it another name at once: whoever moves it
+// aside waits for the lock first. A lock that a neighbour holds, if given, is in the way, too.
 UniqueFd make_lock(const char *path, milliseconds &patience, const UniqueFd &neighbours)
 {
     struct stat there = {};

@@ -1,12 +1,12 @@
 #pragma once
 
-// The exclusive lock that every writer of the job list holds from its load to its flash commit, and others of
-// its kind. It is never held during a transfer.
+// Exclusive locks on files. Every writer of the job list holds that of the configuration from its load to its
+// copy to flash; nobody holds it during a transfer.
 //
-// A lock file lies where others may write, and nobody else must be able to hold the lock or to hide it. It is
-// a regular file of this user's with one name and mode 0600. One of another mode gets that mode, and is
-// waited for: an older program may hold it. Whatever else stands at its name is moved aside, to
-// PATH.aside.PID.NUMBER, and the file made anew.
+// A lock file lies in a folder where others may write, and no other user may hold the lock or hide it. So it
+// is a regular file of this user's with one name and mode 0600. A file with another mode gets that mode and
+// is waited for: an older program may hold it. Anything else at its name is moved aside, to
+// PATH.aside.PID.NUMBER, and the lock file is created again.
 
 #include "common/handles.h"
 #include "config/lock_holder.h"
@@ -14,13 +14,12 @@
 namespace bakjob
 {
 
-// Waits for the lock and takes it; closing the handle releases it. No handle, and errno, when there is none
-// to be had: the lock file cannot be made, or others replace it faster than it is made. Then the trace says
-// so, and the caller goes on without unless it has a reason not to.
+// Waits for the lock and takes it; closing the handle releases it. An empty handle, errno and a trace when
+// the lock file cannot be created, or others replace it faster than that. Most callers then go on without.
 [[nodiscard]] UniqueFd rsync_lock_config(const char *path);
 
-// Has `tell` called when a wait for a lock has lasted a second, once in each wait, with the lock's path and
-// who holds it, if that is known. Null, as at the start: nobody is told.
+// Calls `tell` once in each wait that lasts a second, with the lock's path and its holder, if that is known.
+// Null, as at the start: no call.
 using LockWait = void (*)(const char *path, const std::optional<LockHolder> &holder);
 void rsync_tell_lock_waits(LockWait tell);
 

@@ -36,7 +36,7 @@ enum ExistingFiles : std::int32_t {
     EXISTING_UPDATE = 2  // updated; nothing is deleted
 };
 
-// Texts of a job, by key, of which the store has more than the job's field holds.
+// Texts of a job that are too long for their fields, whole, by key.
 using WholeTexts = std::map<std::string, std::string, std::less<>>;
 
 struct RsyncJob {
@@ -89,7 +89,7 @@ struct JobField {
 
 std::span<const JobField> job_fields();
 
-// The field of a key that there is.
+// The field of a key, which must exist.
 const JobField &job_field(std::string_view key);
 
 std::int32_t &integer_field(RsyncJob &job, const JobField &field);
@@ -100,7 +100,7 @@ const char *text_field(const RsyncJob &job, const JobField &field);
 // Of a job with a text that commands need and that was cut.
 Refusal refusal_of_cut_text(const RsyncJob &job);
 
-// The text of that key as the store has it, when it had to be cut; else null.
+// The text of that key as it is in the store, when the field has only its start; else null.
 const std::string *whole_text_of(const RsyncJob &job, std::string_view key);
 
 inline bool was_cut(const RsyncJob &job, std::string_view key)
@@ -108,7 +108,7 @@ inline bool was_cut(const RsyncJob &job, std::string_view key)
     return whole_text_of(job, key) != nullptr;
 }
 
-// For a field that has got another text.
+// To be called when the field has got another text.
 void forget_whole_text(RsyncJob &job, std::string_view key);
 
 // Copies every field but `next`.

@@ -23,12 +23,12 @@ enum class ChangeResult {
 enum class ToFlash {
     NEVER,
     WHEN_SAVED,
-    WHEN_LOADED // also behind a save that failed: flash then gets what the file has
+    WHEN_LOADED // even when the save failed: flash then gets what the file has
 };
 
 struct ChangeRules {
-    bool needs_lock = false; // else a change goes on without one
-    bool needs_all = true;   // else `change` is called on a list that a job may be missing from
+    bool needs_lock = false; // false: the change is made without a lock when there is none
+    bool needs_all = true;   // false: `change` is also called when the list may lack a job
     ToFlash to_flash = ToFlash::NEVER;
 };
 

@@ -32,7 +32,7 @@ JobChange change_job(const std::string &job_name,
     });
 }
 
-// Without a new name that a job can have, the state goes with the job.
+// Without a new name, or with one that no run can have, the state is removed.
 void move_unrecorded(const std::string &job_name, std::string_view new_name)
 {
     const auto from = JobName::checked(job_name);

@@ -70,24 +70,8 @@ bool reset_if_stale(RsyncJob &job, StateKind kind, const char *now)
     return true;
 }
 
-} // namespace
-
-void rsync_job_time(char (&text)[JOB_TIME_SIZE])
+void record_state(const std::string &job_name, StateKind kind, JobState state)
 {
-    const std::time_t now = std::time(nullptr);
-    std::tm local{};
-    localtime_r(&now, &local);
-    std::strftime(text, sizeof text, "%a %b %d %Y %I:%M:%S %p", &local);
-}
-
-int rsync_state_is_running(std::int32_t state)
-{
-    return state == JOB_RUNNING || state == JOB_RECOVER_RUNNING || state == JOB_STARTING ? 1 : 0;
-}
-
-void rsync_set_job_state(const std::string &job_name, JobState state)
-{
-    const StateKind kind = kind_of_run();
     UnrecordedState as_set{state, {}};
     const JobChange made = rsync_change_jobs(
         [&](RsyncJobList &jobs) {
@@ -106,6 +90,26 @@ void rsync_set_job_state(const std::string &job_name, JobState state)
     } else {
         keep_unrecorded(job_name, kind, as_set);
     }
+}
+
+} // namespace
+
+void rsync_job_time(char (&text)[JOB_TIME_SIZE])
+{
+    const std::time_t now = std::time(nullptr);
+    std::tm local{};
+    localtime_r(&now, &local);
+    std::strftime(text, sizeof text, "%a %b %d %Y %I:%M:%S %p", &local);
+}
+
+int rsync_state_is_running(std::int32_t state)
+{
+    return state == JOB_RUNNING || state == JOB_RECOVER_RUNNING || state == JOB_STARTING ? 1 : 0;
+}
+
+void rsync_set_job_state(const std::string &job_name, JobState state)
+{
+    record_state(job_name, kind_of_run(), state);
 }
 
 void rsync_record_interruption(const std::string &job_name)

@@ -17,7 +17,7 @@ enum JobState : std::int32_t {
     JOB_DONE = 2,           // every folder succeeded
     JOB_RUNNING = 3,
     JOB_FAILED = 4,
-    JOB_INTERRUPTED = 8, // ended by a signal; or was recorded as running, but no process runs it
+    JOB_INTERRUPTED = 8, // ended by a signal, or recorded as running while no process runs it
     JOB_RECOVER_FAILED = 9,
     JOB_RECOVER_RUNNING = 10,
     JOB_KILLED = 11,
@@ -36,9 +36,9 @@ int rsync_state_is_running(std::int32_t state);
 // not in the store changes nothing.
 void rsync_set_job_state(const std::string &job_name, JobState state);
 
-// Records JOB_INTERRUPTED, for a run that is ending. While somebody holds the lock it waits no longer than
-// limit_waits (interrupt.h) allows; then, and where the configuration may be half changed, the state is kept
-// beside the configuration (unrecorded_state.h).
+// Records JOB_INTERRUPTED, for a run that is ending. It waits for the lock no longer than limit_waits
+// (interrupt.h) allows. After that, or when the configuration may be half changed, the state is kept beside
+// the configuration (unrecorded_state.h).
 void rsync_record_interruption(const std::string &job_name);
 
 // Turns the running states of every job without a pid file into JOB_INTERRUPTED, or into the final state that

@@ -24,7 +24,7 @@ namespace
 
 constexpr const char *JOBS = "/backup_mgr/rsync";
 constexpr const char *JOB_COUNT = "/backup_mgr/rsync/count";
-constexpr int MAX_GAP = 1000; // items that are not there, one behind the other
+constexpr int MAX_GAP = 1000; // missing items in a row
 
 constexpr const char *UNREADABLE = "the configuration cannot be read";
 constexpr const char *WRONG_COUNT = "/backup_mgr/rsync/count is missing or below 1, but there are items";
@@ -34,8 +34,8 @@ constexpr const char *SAME_NAME = "the names of two jobs begin with the same 127
 constexpr const char *NO_MEMORY = "there is not enough memory";
 constexpr const char *LONG_TEXT = "a text of a job is longer than 1 MiB";
 
-// The path of one key of one item; reused from key to key, as there are tens of thousands of them. Made
-// without memory of its own: a save that has begun must not end there.
+// The path of one key of one item, reused from key to key, as there are tens of thousands. It allocates
+// nothing: a save that has begun must not fail here.
 class ItemPath
 {
 public:
@@ -51,8 +51,8 @@ private:
     int key_;
 };
 
-// Paths with a number are read from the tree that the count came from, so that one which could not be read
-// does not seem whole by being read again.
+// Paths with a number are read from the tree that the count came from: a tree that could not be read is not
+// read again and then taken for whole.
 bool is_unreadable(int item)
 {
     char start[2] = "";
@@ -126,7 +126,7 @@ public:
         if (missing_ >= MAX_GAP) return GAP;
         if (is_unreadable(item)) return UNREADABLE;
         if (store_has(format_text("%s:2", JOBS))) return TWO_LISTS;
-        // A count that is too low counts all the same: an earlier, longer list may have left what is behind.
+        // A count that is too low is still taken: what follows may be left from an earlier, longer list.
         return count < 1 && store_has(format_text("%s/item:1", JOBS)) ? WRONG_COUNT : failure_;
     }
 
@@ -211,7 +211,7 @@ bool rsync_save_jobs(RsyncJobList &jobs)
     const bool handed_over = rsync_prune_schedule(jobs);
     jobs.clear(); // before the write, which can use their memory
     if (xml_write_file(CONFIG_FILE) >= 0) return true;
-    // The scheduler is not to go by what the file does not say.
+    // The scheduler must not act on entries that the file does not have.
     if (handed_over) rsync_apply_schedule();
     return false;
 }

@@ -15,9 +15,9 @@ struct LockHolder {
     bool neighbour;      // whether another user's processes alone hold it
 };
 
-// Who holds a flock on the open file: a process that has it by one of its handles, one of this user's if
-// there is; else the one that the kernel's list of locks names, which may have handed its handle on and
-// ended. None when nobody does, or when that list has no such file, as with some kinds of file systems.
+// Who holds a flock on the open file: a process with a locked handle of it, one of this user's if there is
+// one; else the process that the kernel's list of locks names, which may have passed its handle on and ended.
+// Nullopt when the file is not locked, or not in that list, as on some file systems.
 std::optional<LockHolder> flock_holder(int file);
 
 } // namespace bakjob

@@ -37,8 +37,8 @@ pid_t process_id_in(int file)
     return std::max(whole_number<pid_t>(content).value_or(0), 0);
 }
 
-// Whoever removes a pid file locks it first, so that it does not become another one between the look and the
-// removal. Everybody can read the file, so that everybody can lock it, too: nobody is waited for long.
+// Whoever removes a pid file locks it first, so that no other file takes its place between the check and the
+// removal. Every user can read the file, and so lock it: the wait is short.
 void lock_briefly(int file)
 {
     for (int i = 0; i < 100 && flock(file, LOCK_EX | LOCK_NB) != 0 && errno == EWOULDBLOCK; ++i) {
@@ -73,6 +73,13 @@ bool runs_job(pid_t pid, std::string_view job_name)
     return is_bakjob && is_named;
 }
 
+// Of the process that the pid file names; `file` is a word of a command in backquotes.
+bool is_restore_run(const std::string &ps, const std::string &file)
+{
+    return run_shell(format_text("%s | grep `cat %s`'' | grep -- ' -i ' | grep -v '%s'  >/dev/null 2>&1",
+                                 ps.c_str(), file.c_str(), ps.c_str())) == 0;
+}
+
 } // namespace
 
 bool rsync_pid_file_absent(const JobName &job)
@@ -104,7 +111,7 @@ PidFile rsync_read_pid_file(const JobName &job)
         read.process = process_id_in(read.handle.get());
         read.is_run = read.process > 0 && runs_job(read.process, job.text());
     } else {
-        read.handle = UniqueFd(open(read.path.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC)); // whatever it is
+        read.handle = UniqueFd(open(read.path.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC)); // of any type
     }
     return read;
 }
@@ -138,10 +145,7 @@ int rsync_kill_job_process(const JobName &job)
     }
     const std::string ps = rsync_ps_command();
     const std::string file = in_backquotes(escape_path(path));
-    const std::string is_restore =
-        format_text("%s | grep `cat %s`'' | grep -- ' -i ' | grep -v '%s'  >/dev/null 2>&1", ps.c_str(),
-                    file.c_str(), ps.c_str());
-    if (run_shell(is_restore) == 0) run_options.restore_mode = 1;
+    if (is_restore_run(ps, file)) run_options.restore_mode = 1;
     return run_shell(format_text("kill -9 `cat %s`", file.c_str()));
 }
 

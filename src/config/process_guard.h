@@ -16,22 +16,22 @@ namespace bakjob
 // running job until rsync_kill_job removes it.
 bool rsync_pid_file_absent(const JobName &job);
 
-// A pid file: what it says, and which file it is, so that a later one is told from it.
+// A pid file: what it says, and an open handle, which tells it from a later file of that name.
 struct PidFile {
     std::string path;
-    UniqueFd handle; // none: there was no file
+    UniqueFd handle; // empty: there is no file
     pid_t process;   // 0: the file holds no process id
     bool is_run;     // the process is one that runs the job, by its command line
 };
 
-// Makes the pid file, with this process's id; nobody ever sees it without. No handle (errno) when it cannot
-// be made; EEXIST: another run was quicker.
+// Creates the pid file together with this process's id in it. An empty handle (errno) when that fails;
+// EEXIST: another run was quicker.
 PidFile rsync_write_pid_file(const JobName &job);
 
 PidFile rsync_read_pid_file(const JobName &job);
 
-// The process that the job's pid file names, if it is one that runs the job; else 0, also for another process
-// that has got its number.
+// The process that the job's pid file names, if it runs the job; else 0, also when another process has got
+// its number.
 pid_t rsync_running_process(const JobName &job);
 
 // Removes the file if it still stands at its path. 0 when it is gone by that, else -1. Takes no memory.

@@ -40,7 +40,7 @@ struct Group {
     std::string name_path; // where the name of ours stands; empty: there is none
 };
 
-// A count beyond all reason is damage: nothing is walked, and nothing deleted.
+// A count beyond all reason is damage: no entry is read or deleted.
 int bounded_count(const char *path)
 {
     const int count = xml_get_int(path);
@@ -83,7 +83,7 @@ std::string entry_command(int entry)
     return store_text(entry_path(entry) + "/run", TEXT_SIZE + 1);
 }
 
-// Texts are short, and room for a long one costs time.
+// Most texts are short, and room for a long one costs time.
 std::string text_at(const std::string &path)
 {
     std::string text = store_text(path, TEXT_SIZE + 1);
@@ -140,8 +140,8 @@ Names names_of(const RsyncJobList &jobs)
     return names;
 }
 
-// Whether one of the names stands in single quotes, of which it may have some itself. There are as many
-// entries as jobs, so a look at each name for each entry would be too many.
+// Whether the command has one of the names in single quotes. A name may hold single quotes itself. Entries
+// are as many as jobs, so comparing each entry with each name would take too long.
 bool names_one_of(const Names &names, std::string_view command)
 {
     for (std::size_t open = command.find('\''); open < command.size(); open = command.find('\'', open + 1)) {
@@ -158,7 +158,7 @@ bool names(std::string_view command, std::string_view job_name)
     return contains(command, '\'' + std::string(job_name) + '\'');
 }
 
-// Deletes the entries whose command `goes`; how many. The last one takes the group along.
+// Deletes the entries whose command `goes`, and the group when none is left. How many were deleted.
 template <class Goes>
 int delete_entries(const Goes &goes)
 {
@@ -195,7 +195,7 @@ int rsync_schedule_names_job(std::string_view command)
     return names_one_of(names_of(*job_list), command) ? 1 : 0;
 }
 
-// A command that was cut may name a job behind the cut, so it is not judged.
+// A command that was cut may name a job behind the cut, so it stays.
 bool rsync_prune_schedule(const RsyncJobList &jobs)
 {
     const Names listed = names_of(jobs);

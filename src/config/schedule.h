@@ -3,7 +3,7 @@
 // The scheduler's entries for backup jobs: the group "rsync" of the scheduler's part of the configuration
 // store. An entry names its job in the command that it runs.
 //
-// A function without a job list as its argument goes by the process's one list.
+// A function without a job list as its argument uses the process's one list.
 
 #include "config/job_list.h"
 
@@ -36,13 +36,12 @@ bool rsync_schedules_job(const RsyncJobList &jobs, std::string_view command, std
 // Every entry of the scheduler, those of other groups than the backup jobs' as well.
 std::vector<ScheduleEntry> rsync_all_schedules();
 
-// Adds an entry, for the caller to save and hand over as above. False, and nothing added, when the store does
-// not take it, or has more entries than their count says, one of which it would replace.
+// Adds an entry; saving and handing over are up to the caller, as above. False, with nothing added, when the
+// store refuses it, or has more entries than their count says: it would replace one of them.
 bool rsync_add_schedule(const ScheduleEntry &entry);
 
-// Deletes the entries that name no listed job; the last one left takes the group with it. Does not write the
-// configuration file: the save that it is part of does. Whether anything was deleted, and with that the
-// scheduler told.
+// Deletes the entries that name no listed job, and the group when none is left. Writes no configuration file:
+// that is up to the save. True when something was deleted; then the scheduler has been told.
 bool rsync_prune_schedule(const RsyncJobList &jobs);
 bool rsync_prune_schedule();
 

@@ -43,7 +43,7 @@ inline std::string whole_text(const std::string &path)
     return text;
 }
 
-// Whether a text from whole_text may go on in the store.
+// Whether a text from whole_text may be longer in the store.
 inline bool is_cut(const std::string &text)
 {
     return text.size() >= MAX_TEXT_SIZE - 1;

@@ -1,8 +1,8 @@
 #pragma once
 
-// A state of a job that the configuration did not take, for example on a full disk: kept in a file of its
-// own, so that nobody takes the state before it for the present one. Backups and restores have a state each.
-// Use under the configuration lock.
+// A state that could not be written into the configuration, for example on a full disk. It is kept in a file
+// of its own, so that nobody takes the state before it for the present one. Backups and restores have a state
+// each. Use under the configuration lock.
 
 #include "common/job_name.h"
 
@@ -20,19 +20,19 @@ struct UnrecordedState {
     std::string time; // as rsync_job_time writes it
 };
 
-// Keeps it in place of an earlier one of its kind. False (errno) when that cannot be written either.
+// Keeps it in place of an earlier one of its kind. False (errno) when this file cannot be written either.
 bool rsync_keep_unrecorded(const JobName &job, StateKind kind, const UnrecordedState &state);
 
 // Nullopt when the configuration has the job's state of that kind.
 std::optional<UnrecordedState> rsync_unrecorded_state(const JobName &job, StateKind kind);
 
-// To be called when the configuration has taken a state of that kind.
+// To be called when a state of that kind is in the configuration.
 void rsync_forget_unrecorded(const JobName &job, StateKind kind);
 
 // To be called when the job is deleted.
 void rsync_forget_unrecorded(const JobName &job);
 
-// To be called when the job gets another name, in the place of whatever an earlier job of that name has left.
+// To be called when the job gets another name. What an earlier job of that name has left is removed.
 void rsync_rename_unrecorded(const JobName &job, const JobName &new_name);
 
 } // namespace bakjob
