@@ -5,7 +5,8 @@
 //                     start alone (start_check.h)
 //
 // It never asks a question, and gives up on a far end that stays silent. What moves no job's data may not
-// take long in all, even if the far end keeps talking (stock_program.h).
+// take long in all, even if the far end keeps talking (stock_program.h), and so a dry run that is a probe
+// goes into no folder either.
 
 #include "start_check.h"
 #include "stock_program.h"
@@ -105,7 +106,7 @@ int main(int argc, char **argv)
     }
     const std::string job = take_option(arguments, JOB_NAME);
     const bool dump_size = !take_option(arguments, "--dump-size").empty();
-    const bool start_only = dump_size && has_option(arguments, "--dry-run");
+    const bool start_only = has_option(arguments, "--dry-run") && (dump_size || (job.empty() && is_probe()));
     const bool moves_data = !job.empty() && !start_only;
     add_limits(arguments, moves_data);
     setenv("RSYNC_RSH", REMOTE_SHELL, 1);
