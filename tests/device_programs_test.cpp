@@ -170,7 +170,14 @@ TEST_F(Programs, ADryRunOfAJobFailsAsTheWholeOneDoes)
         EXPECT_EQ(shell(command).status, one.status) << "the whole one: " << command;
         EXPECT_EQ(shell(command + " --dump-size").status, one.status) << command;
     }
-    EXPECT_FALSE(exists("/remote/data/there/aaa"));
+    for (const char *command : {"/usr/sbin/rsync --job-name=j -av --dump-size --dry-run --delete ",
+                                "BAKJOB_RUN=1 /usr/sbin/rsync -av --dry-run "}) {
+        for (const std::string &ends : {data + "many/ /mnt/HD/there", here + "many/ " + data + "there"}) {
+            const Ran ran = shell(command + ends);
+            EXPECT_EQ(ran.status, 0) << command << ends;
+            EXPECT_EQ(ran.output.find("aaa"), std::string::npos) << "it goes into no folder: " << command;
+        }
+    }
 }
 
 TEST_F(Programs, RsyncReachesEveryKindOfPlaceAndAsksNothing)

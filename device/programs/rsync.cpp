@@ -5,7 +5,8 @@
 //                     start alone (start_check.h)
 //
 // It never asks a question, and gives up on a far end that stays silent. What moves no job's data may not
-// take long in all, even if the far end keeps talking (stock_program.h).
+// take long in all, even if the far end keeps talking (stock_program.h), and so a dry run that is a probe
+// goes into no folder either.
 
 #include "start_check.h"
 #include "stock_program.h"
@@ -35,6 +36,9 @@ constexpr std::string_view JOB_NAME = "--job-name=";
 constexpr const char *CONNECT_LIMIT = "--contimeout=30";
 constexpr const char *SILENCE_LIMIT = "--timeout=60";
 
+// A small command is a few words to and fro; held back, most of them wait 40 ms.
+constexpr const char *AT_ONCE = "--sockopts=TCP_NODELAY";
+
 enum class Place { HERE, BEHIND_SHELL, DAEMON };
 
 // [USER@]HOST:PATH, [USER@]HOST::MODULE or rsync://..., where HOST may be an IPv6 address in brackets.
@@ -59,7 +63,7 @@ bool has_option(const Arguments &arguments, std::string_view start)
 
 // Stock rsync refuses a connect limit where it makes no connection of its own. How long a job's transfer may
 // be silent is the job's to say.
-void add_limits(Arguments &arguments, bool of_job)
+void add_connection_options(Arguments &arguments, bool moves_data, bool of_job_module)
 {
     bool daemon = false;
     bool remote = false;
@@ -69,11 +73,11 @@ void add_limits(Arguments &arguments, bool of_job)
         remote = remote || place != Place::HERE;
     }
     const bool own_shell = has_option(arguments, "-e") || has_option(arguments, "--rsh");
-    if (remote && !of_job && !has_option(arguments, "--timeout"))
+    if (remote && !moves_data && !has_option(arguments, "--timeout"))
         arguments.insert(arguments.begin(), SILENCE_LIMIT);
-    if (daemon && !own_shell && !has_option(arguments, "--contimeout")) {
-        arguments.insert(arguments.begin(), CONNECT_LIMIT);
-    }
+    if (!daemon || own_shell) return;
+    if (!has_option(arguments, "--contimeout")) arguments.insert(arguments.begin(), CONNECT_LIMIT);
+    if (of_job_module && !has_option(arguments, "--sockopts")) arguments.insert(arguments.begin(), AT_ONCE);
 }
 
 // Takes the option out of the arguments; the last one of those that begin so, empty when there is none.
@@ -105,9 +109,9 @@ int main(int argc, char **argv)
     }
     const std::string job = take_option(arguments, JOB_NAME);
     const bool dump_size = !take_option(arguments, "--dump-size").empty();
-    const bool start_only = dump_size && has_option(arguments, "--dry-run");
+    const bool start_only = has_option(arguments, "--dry-run") && (dump_size || (job.empty() && is_probe()));
     const bool moves_data = !job.empty() && !start_only;
-    add_limits(arguments, moves_data);
+    add_connection_options(arguments, moves_data, !job.empty() || is_probe());
     setenv("RSYNC_RSH", REMOTE_SHELL, 1);
     setenv("RSYNC_PASSWORD", "", 0);
     arguments.insert(arguments.begin(), job.empty() ? OWN_NAME : OWN_NAME + (' ' + job));

@@ -23,11 +23,6 @@ constexpr const char *TRANSFER_MARK = "DEVICE_TRANSFER";
 constexpr int PROBE_SECONDS = 120;
 constexpr int KILL_SECONDS = 5;
 
-bool is_probe()
-{
-    return std::getenv(bakjob::RUN_MARK) != nullptr && std::getenv(TRANSFER_MARK) == nullptr;
-}
-
 std::chrono::seconds probe_bound()
 {
     const char *const text = std::getenv("DEVICE_PROBE_SECONDS");
@@ -119,6 +114,11 @@ int become_stock(const StockProgram &program, const std::vector<std::string> &ar
     execv(program.path, pointers.data());
     std::fprintf(stderr, "%s: cannot run %s: %s\n", program.name, program.path, std::strerror(errno));
     return program.failed;
+}
+
+bool is_probe()
+{
+    return std::getenv(bakjob::RUN_MARK) != nullptr && std::getenv(TRANSFER_MARK) == nullptr;
 }
 
 int run_stock(const StockProgram &program, const std::vector<std::string> &arguments)
