@@ -42,7 +42,7 @@ struct JobChange {
     }
 };
 
-// `change` works on the loaded list and says whether to save it. The process's list is empty afterwards.
+// `change` works on the process's list, loaded, and says whether to save it. The list is empty afterwards.
 JobChange rsync_change_jobs(const std::function<bool(RsyncJobList &jobs)> &change,
                             const ChangeRules &rules = {});
 
