@@ -79,7 +79,9 @@ TEST_F(Snapshot, NamesThatCannotBeQuotedMoveNothing)
 {
     run_options.debug_mode = 1;
     for (const auto &[folder, name] : Keys{{"", "j"}, {"/mnt/HD/a\"b", "j"}, {FOLDER, "a/../b"}})
-        EXPECT_FALSE(has(printed_by([&] { rsync_snapshot_rotate(folder, 3, name); }), "[rm")) << folder;
+        EXPECT_FALSE(
+            has(printed_by([&path = folder, &job = name] { rsync_snapshot_rotate(path, 3, job); }), "[rm"))
+            << folder;
     EXPECT_EQ(rotation_command("/a", "j", 2, 2), "rm -rf /a/j.2");
     EXPECT_EQ(rotation_command("/a", "j", 1, 2), "mv /a/j.1 /a/j.2");
     EXPECT_EQ(rotation_command("/a", "", 0, 2), "cp -al /a/backup.0 /a/backup.1");

@@ -3,12 +3,9 @@
 #include "soak_support.h"
 
 #include <csignal>
-#include <filesystem>
 #include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
-
-namespace fs = std::filesystem;
 
 namespace
 {
