@@ -106,7 +106,7 @@ void Check::values()
                 "Delete the job and add it anew.");
     }
     if (job_.server_type == SERVER_SAME_KIND && *job_.rsync_user != '\0' &&
-        std::string_view(job_.rsync_user) != "root") {
+        std::string_view(job_.rsync_user) != DEFAULT_USER) {
         note("rsync_user", "a run looks by it for missing folders, but transfers as root",
              "bakjobctl set NAME rsync_user=root");
     }

@@ -42,7 +42,8 @@ public:
     {
         copy_text(job_.job_name, name_.text());
         job_.rsync_pwd_file[0] = '\0';
-        if (job_.server_type == SERVER_SAME_KIND) copy_text(job_.rsync_user, "root"); // as the transfer does
+        if (job_.server_type == SERVER_SAME_KIND)
+            copy_text(job_.rsync_user, DEFAULT_USER); // as the transfer does
         job_ = rsync_with_defaults(job_);
         copy_text(password_path, job_.rsync_pwd_file);
         copy_text(config_path, remote_config_copy(name_));

@@ -281,8 +281,8 @@ RsyncJob job_with_defaults(const std::string &name)
     job.keep_exist_file = EXISTING_UPDATE;
     job.inc_number = MIN_SNAPSHOTS;
     job.retry = 3;
-    copy_text(job.rsync_user, "root");
-    copy_text(job.ssh_user, "root");
+    copy_text(job.rsync_user, DEFAULT_USER);
+    copy_text(job.ssh_user, DEFAULT_USER);
     copy_text(job.port, DEFAULT_PORT);
     if (!copy_text(job.job_name, name)) throw Failure("the name is too long");
     return job;

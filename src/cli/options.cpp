@@ -2,6 +2,7 @@
 
 #include "cli/run_job.h"
 #include "common/debug_log.h"
+#include "common/job_files.h"
 #include "common/password.h"
 #include "common/run_options.h"
 #include "config/job_state.h"
@@ -20,7 +21,6 @@ namespace
 {
 
 constexpr int REFUSED = 255;
-constexpr long long HIGHEST_SEQ = 10;
 
 // What the options of one command line share.
 struct OptionLoop {
@@ -68,7 +68,7 @@ Ending restore(OptionLoop & /*loop*/, const char * /*argument*/)
 Ending recover(OptionLoop & /*loop*/, const char *argument)
 {
     const long long seq = std::strtoll(argument, nullptr, 10);
-    if (seq == 0 || seq > HIGHEST_SEQ || seq < INT32_MIN) {
+    if (seq == 0 || seq > MAX_SNAPSHOTS || seq < INT32_MIN) {
         DebugLog("ERROR: input error!\n");
         return REFUSED;
     }

@@ -17,7 +17,7 @@ RsyncJob rsync_with_defaults(const RsyncJob &job)
     RsyncJob filled = job;
     const auto name = JobName::checked(job.job_name);
     if (filled.rsync_pwd_file[0] == '\0' && name) copy_text(filled.rsync_pwd_file, password_file(*name));
-    if (filled.rsync_user[0] == '\0') copy_text(filled.rsync_user, "root");
+    if (filled.rsync_user[0] == '\0') copy_text(filled.rsync_user, DEFAULT_USER);
     if (filled.rsync_pwd[0] == '\0') {
         copy_text(filled.rsync_pwd, DEFAULT_DAEMON_PASSWORD);
         filled.pwd_encoded = 0;

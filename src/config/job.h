@@ -22,6 +22,7 @@ namespace bakjob
 {
 
 inline constexpr const char *DEFAULT_PORT = "873";
+inline constexpr const char *DEFAULT_USER = "root"; // over there
 inline constexpr int MAX_PORT = 65535;
 
 enum ServerType : std::int32_t { SERVER_SAME_KIND = 1, SERVER_ANY = 2 };

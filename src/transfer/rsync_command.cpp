@@ -46,9 +46,9 @@ Checked remote_shell(const RsyncJob &job, const RsyncJob &filled)
 const char *deletion(int keep_exist_file)
 {
     switch (keep_exist_file) {
-    case 1:
+    case EXISTING_KEEP:
         return " --ignore-existing";
-    case 2:
+    case EXISTING_UPDATE:
         return " ";
     default:
         return " --delete";
@@ -80,7 +80,7 @@ Checked options(const RsyncJob &job, const RsyncJob &filled)
 std::string endpoint(const RsyncJob &job, bool named)
 {
     if (job.rsync_mode != RSYNC_MODE_DAEMON) return rsync_address(nullptr, job.remote_ip, Reached::OVER_SSH);
-    return rsync_address(named ? job.rsync_user : "root", job.remote_ip, Reached::BY_DAEMON);
+    return rsync_address(named ? job.rsync_user : DEFAULT_USER, job.remote_ip, Reached::BY_DAEMON);
 }
 
 } // namespace
