@@ -3,12 +3,8 @@
 #include "config/job_list.h"
 #include "config/job_store.h"
 #include "support.h"
-#include "transfer/backup.h"
-
-#include <filesystem>
 
 using namespace bakjob;
-namespace fs = std::filesystem;
 
 using JobList = Appliance;
 
@@ -195,35 +191,4 @@ TEST_F(JobList, OnlyThePasswordFileIsWrittenBackToTheCaller)
     EXPECT_STREQ(job.rsync_user, "");
     EXPECT_STREQ(job.port, "");
     EXPECT_EQ(job.inc_number, 99);
-}
-
-TEST_F(JobList, ThePasswordFileHoldsWhatTheServerTakes)
-{
-    struct Case {
-        int pwd_encoded;
-        int server_type;
-        std::string password;
-        std::string content; // none: refused
-    };
-    const std::string longest(127, 'p');
-    const std::string path = "/tmp/r_it's $x.passwd";
-    write_file("/tmp/victim", "kept");
-    for (const Case &one : std::vector<Case>{{0, 2, "secret", "secret\n"},
-                                             {0, 1, "secret", "c2VjcmV0\n"},
-                                             {1, 2, "c2VjcmV0", "secret\n"},
-                                             {1, 1, "c2VjcmV0", "c2VjcmV0\n"},
-                                             {0, 2, longest, longest + "\n"},
-                                             {0, 1, longest.substr(33), ""},
-                                             {1, 2, "!", ""}}) {
-        CurrentJob = make_job("it's $x");
-        CurrentJob.pwd_encoded = one.pwd_encoded;
-        CurrentJob.server_type = one.server_type;
-        copy_text(CurrentJob.rsync_pwd, one.password);
-        fs::remove(path);
-        fs::create_symlink("/tmp/victim", path);
-        EXPECT_EQ(rsync_write_password_file(), !one.content.empty());
-        if (one.content.empty()) continue;
-        EXPECT_EQ(read_file(path) + octal_mode(path), one.content + "600");
-    }
-    EXPECT_EQ(read_file("/tmp/victim"), "kept");
 }

@@ -14,9 +14,8 @@ namespace
 
 struct Case {
     Keys keys;
-    std::string prepared_by; // shell
-    std::string rsync;       // what it does for a kind of call
-    std::string ssh;
+    std::string where; // "here", or the program in whose place the script is
+    std::string script;
     Reason reason; // `seen`: in part
 };
 
@@ -29,55 +28,41 @@ TEST_F(Reasons, TellWhichStepFailedAndWhatWasSeen)
     const std::string missing = "rsync: change_dir failed: No such file or directory (2)";
     const std::string denied = "Permission denied (password).";
     const std::string none = "/mnt/HD/HD_a2/None";
-    const std::string at_list = "[ $kind != list ] || echo '";
-    const std::string at_write = "[ $kind != write ] || echo '";
+    const std::string at_list = "[ $kind != list ] || echo '" + refused + "'";
+    const std::string at_write = "[ $kind != write ] || echo '" + missing + "'";
     const std::string at_run = "[ $kind != run ] || exit ";
     const Keys row = keys_of("backup_type=2 inc_enable=1");
-    const Keys tried_twice = keys_of("retry=2 retry_interval=1");
+    const Keys twice = keys_of("retry=2 retry_interval=1");
+    const Keys long_path{{"remote_path", std::string(1000, 'x')}};
     const std::vector<Case> cases = {
-        {{{"local_path", none}}, "", "", "", {.step = FOLDER, .seen = "no share holds [" + none + "]"}},
-        {{}, "rm -r " + SHARE, "", "", {.step = FOLDER, .seen = SHARE + "] cannot be entered: No such file"}},
-        {{{"remote_path", std::string(1000, 'x')}},
-         "",
-         "",
-         "",
-         {.step = FOLDER, .seen = "remote_path refused: too long"}},
-        {row, "ln -s /etc " + SHARE + "/daily.1", "", "", {.step = FOLDER, .seen = "daily.1] is a link"}},
-        {{{"use_ssh", "1"}},
-         "",
-         "",
+        {{{"local_path", none}}, "", "", {.step = FOLDER, .seen = "no share holds [" + none + "]"}},
+        {{}, "here", "rm -r " + SHARE, {.step = FOLDER, .seen = SHARE + "] cannot be entered: No such file"}},
+        {long_path, "", "", {.step = FOLDER, .seen = "remote_path refused: too long"}},
+        {row, "here", "ln -s /etc " + SHARE + "/daily.1", {.step = FOLDER, .seen = "daily.1] is a link"}},
+        {keys_of("use_ssh=1"),
+         SSH,
          "echo '" + denied + "'",
          {.step = LOGIN, .seen = denied, .code = SSH_DENIED}},
-        {keys_of("rsync_pwd=? pwd_encoded=1"),
+        {keys_of("rsync_pwd=? pwd_encoded=1"), "", "", {.step = PASSWORD, .seen = "it has no plain form"}},
+        {{}, RSYNC, at_list, {.step = DAEMON, .seen = refused, .code = REPLY_REFUSED}},
+        {keys_of("backup_type=2"), RSYNC, at_write, {.step = TARGET, .seen = missing, .code = REPLY_NO_DIR}},
+        {keys_of("remote_path=m/sub"),
+         RSYNC,
+         at_write,
+         {.step = TARGET, .seen = "exit code 255", .code = REPLY_NO_DIR}},
+        {keys_of("remote_path=a*b"),
          "",
          "",
-         "",
-         {.step = PASSWORD, .seen = "rsync_pwd refused: it has no plain form"}},
-        {{}, "", at_list + refused + "'", "", {.step = DAEMON, .seen = refused, .code = REPLY_REFUSED}},
-        {{{"backup_type", "2"}},
-         "",
-         at_write + missing + "'",
-         "",
-         {.step = TARGET, .seen = missing, .code = REPLY_NO_DIR}},
-        {{{"remote_path", "backup/sub"}},
-         "",
-         at_write + missing + "'",
-         "exit 255",
-         {.step = TARGET, .seen = "was not fetched: exit code 255", .code = REPLY_NO_DIR}},
-        {{{"remote_path", "a*b"}},
-         "",
-         "",
-         "",
-         {.step = COMMAND, .seen = "remote_path refused: character special to the shell"}},
-        {{}, "", "[ $kind != dry ] || exit 10", "", {.step = DRY_RUN, .exit_code = 10, .attempt = 1}},
-        {tried_twice, "", at_run + "11", "", {.step = TRANSFER, .exit_code = 11, .attempt = 2}},
-        {tried_twice, "", at_run + "23", "", {.step = TRANSFER, .exit_code = 23, .attempt = 1}}};
+         {.step = COMMAND, .seen = "refused: character special to the shell"}},
+        {{}, RSYNC, "[ $kind != dry ] || exit 10", {.step = DRY_RUN, .exit_code = 10, .attempt = 1}},
+        {twice, RSYNC, at_run + "11", {.step = TRANSFER, .exit_code = 11, .attempt = 2}},
+        {twice, RSYNC, at_run + "23", {.step = TRANSFER, .exit_code = 23, .attempt = 1}}};
     for (const Case &one : cases) {
         SetUp();
-        const Fake rsync(RSYNC, KIND_OF_CALL + one.rsync + "\n");
-        const Fake ssh(SSH, one.ssh + '\n');
+        const Fake rsync(RSYNC, KIND_OF_CALL + (one.where == RSYNC ? one.script : "") + "\n");
+        const Fake ssh(SSH, one.where == SSH ? one.script : "exit 255");
         add_job(one.keys);
-        shell(one.prepared_by);
+        if (one.where == "here") shell(one.script);
         const RunReport report = run_job("daily", false);
         EXPECT_FALSE(report.reason) << report.reason.seen;
         ASSERT_EQ(report.folders.size(), 1U) << one.reason.seen;

@@ -167,7 +167,8 @@ TEST_F(RemoteSide, KillEndsARunAndItsTransfersButNoOther)
     };
     run("-r " + quoted); // so that there is something to restore
     for (const bool restore : {false, true}) {
-        write_file(SHARE + "/" + killed + "/big", std::string(2'000'000, restore ? 'y' : 'z'));
+        // Of another size, as it may be of the same second.
+        write_file(SHARE + "/" + killed + "/big", std::string(restore ? 2'000'002 : 2'000'001, 'y'));
         const Fake slow(RSYNC, KIND_OF_CALL + "[ $kind != run ] || set -- --bwlimit=100 \"$@\"\n"
                                               "exec /usr/sbin/rsync.real \"$@\"\n");
         in_background((restore ? "-i x -r " : "-r ") + quoted);

@@ -3,6 +3,7 @@
 #include "config/current_job.h"
 #include "platform/config_store.h"
 #include "support.h"
+#include "transfer/backup.h"
 #include "transfer/rsync_command.h"
 
 #include <filesystem>
@@ -177,4 +178,35 @@ TEST_F(Command, HostileAndOversizedValuesAreQuotedOrRefused)
     RsyncJob unused = make_job("j");
     copy_text(unused.ssh_user, "not used; here");
     EXPECT_NE(build(unused), "(refused)");
+}
+
+TEST_F(Command, ThePasswordFileHoldsWhatTheServerTakes)
+{
+    struct Case {
+        int pwd_encoded;
+        int server_type;
+        std::string password;
+        std::string content; // none: refused
+    };
+    const std::string longest(127, 'p');
+    const std::string path = "/tmp/r_it's $x.passwd";
+    write_file("/tmp/victim", "kept");
+    for (const Case &one : std::vector<Case>{{0, 2, "secret", "secret\n"},
+                                             {0, 1, "secret", "c2VjcmV0\n"},
+                                             {1, 2, "c2VjcmV0", "secret\n"},
+                                             {1, 1, "c2VjcmV0", "c2VjcmV0\n"},
+                                             {0, 2, longest, longest + "\n"},
+                                             {0, 1, longest.substr(33), ""},
+                                             {1, 2, "!", ""}}) {
+        CurrentJob = make_job("it's $x");
+        CurrentJob.pwd_encoded = one.pwd_encoded;
+        CurrentJob.server_type = one.server_type;
+        copy_text(CurrentJob.rsync_pwd, one.password);
+        std::filesystem::remove(path);
+        std::filesystem::create_symlink("/tmp/victim", path);
+        EXPECT_EQ(rsync_write_password_file(), !one.content.empty());
+        if (one.content.empty()) continue;
+        EXPECT_EQ(read_file(path) + octal_mode(path), one.content + "600");
+    }
+    EXPECT_EQ(read_file("/tmp/victim"), "kept");
 }

@@ -23,7 +23,7 @@ constexpr std::array COMMANDS = {
     Command{"bakjobctl set one retry=2 user_description=changed", true},
     Command{"bakjobctl delete two", true},
     Command{"bakjobctl disable one", true},
-    Command{"bakjobctl schedule one '5 4 * * *'", true},
+    Command{"bakjobctl schedule two '5 4 * * *'", true},
     Command{"bakjob -r one", false},
     Command{"bakjob -k three", false},
     Command{"bakjob -a", false},
@@ -59,16 +59,13 @@ protected:
     // What each command begins with, from now on.
     void remember()
     {
-        ASSERT_EQ(shell("rm -rf /var/tmp/kept && mkdir /var/tmp/kept && cp -a --parents " + STORE + " " +
-                        FLASH + " " + CRON + " /var/tmp/kept")
-                      .status,
-                  0);
+        ASSERT_EQ(shell("tar -cPf /var/tmp/kept " + STORE + " " + FLASH + " " + CRON).status, 0);
         before_ = contents();
     }
 
     void TearDown() override
     {
-        shell("rm -rf /var/tmp/kept /var/run/bakjob_*");
+        shell("rm -f /var/tmp/kept /var/run/bakjob_*");
         Holds::TearDown();
     }
 
@@ -77,7 +74,7 @@ protected:
     {
         const std::string remote = "/remote/backup/S1_remote_backup/one";
         shell("rm -rf /etc/NAS_CFG/* /var/lib/device_flash/* /var/run/bakjob_* /tmp/r_* /tmp/rsync_* " +
-              remote + "/* /remote/backup/_remote_backup; mkdir -p " + remote + "; cp -a /var/tmp/kept/. /");
+              remote + "/* /remote/backup/_remote_backup; mkdir -p " + remote + "; tar -xPf /var/tmp/kept");
         write_file("/var/run/bakjob_three.pid", "2147483646\n");
     }
 
