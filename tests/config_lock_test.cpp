@@ -234,15 +234,21 @@ TEST_F(ConfigLock, OneThatIsReplacedInAWaitIsWaitedForAnew)
 // He opened the file while everybody could.
 TEST_F(ConfigLock, ANeighbourWhoGotHoldOfAnOldLockIsPassedBy)
 {
-    write_file(LOCK, "");
-    fs::permissions(LOCK, fs::perms(0644));
-    const Holder neighbour([] {
-        become_neighbour();
-        return as_older_programs_do(LOCK);
-    });
-    take_it();
-    EXPECT_EQ(got(), "too early");
-    EXPECT_TRUE(is_lock(LOCK));
+    for (const bool by_another : {false, true}) { // that has ended since
+        SetUp();
+        write_file(LOCK, "");
+        fs::permissions(LOCK, fs::perms(0644));
+        const Holder neighbour([by_another] {
+            become_neighbour();
+            if (!by_another) return as_older_programs_do(LOCK);
+            UniqueFd file(open(LOCK.c_str(), O_RDONLY));
+            in_child([&] { return flock(file.get(), LOCK_EX); });
+            return file;
+        });
+        take_it();
+        EXPECT_EQ(got(), "too early");
+        EXPECT_TRUE(is_lock(LOCK));
+    }
 }
 
 // Where the kernel lets a neighbour give another name to a file that he cannot open.

@@ -27,9 +27,9 @@ std::string program_of(pid_t process)
     return printable(name);
 }
 
-// A line of the kernel's about a lock: its number, "->" for one that waits, kind, rule, access, process,
-// place.
-pid_t flock_in(const std::string &line, const std::string &place)
+// The process in a line of the kernel's about a lock at that place: its number, "->" for one that waits,
+// kind, rule, access, process, place. 0 for one that has ended since it took the lock; nullopt: another lock.
+std::optional<pid_t> flock_in(const std::string &line, const std::string &place)
 {
     std::istringstream words(line);
     std::string number;
@@ -39,7 +39,7 @@ pid_t flock_in(const std::string &line, const std::string &place)
     std::string at;
     pid_t process = 0;
     words >> number >> kind >> rule >> access >> process >> at;
-    return kind == "FLOCK" && at == place ? process : 0;
+    return kind == "FLOCK" && at == place ? std::optional(process) : std::nullopt;
 }
 
 bool has_locked(const fs::path &process, const std::string &place)
@@ -48,7 +48,7 @@ bool has_locked(const fs::path &process, const std::string &place)
     for (const auto &handle : fs::directory_iterator(process / "fdinfo", none)) {
         std::ifstream info(handle.path());
         for (std::string line; std::getline(info, line);) {
-            if (line.starts_with("lock:") && flock_in(line.substr(5), place) != 0) return true;
+            if (line.starts_with("lock:") && flock_in(line.substr(5), place)) return true;
         }
     }
     return false;
@@ -58,8 +58,8 @@ std::optional<LockHolder> listed_holder(const std::string &place)
 {
     std::ifstream locks("/proc/locks");
     for (std::string line; std::getline(locks, line);) {
-        const pid_t process = flock_in(line, place);
-        if (process > 0) return LockHolder{process, program_of(process), false};
+        const auto process = flock_in(line, place);
+        if (process > 0) return LockHolder{*process, program_of(*process), false};
     }
     return std::nullopt;
 }
