@@ -2,8 +2,8 @@
 //
 //   manage_jobs HOST SHARE SSH_PASSWORD
 //
-// lists the jobs, adds one that backs SHARE up to HOST, reads it back, asks what the remote side offers, and
-// deletes the job again. SSH_PASSWORD is base64 text.
+// lists the jobs, adds one that fetches HOST's module "backup" into SHARE, reads it back, asks what the
+// remote side offers, and deletes the job again. SSH_PASSWORD is base64 text.
 
 #include <bakjob/common/fixed_text.h>
 #include <bakjob/common/job_files.h>

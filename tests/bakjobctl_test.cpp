@@ -134,7 +134,7 @@ TEST_F(CtlDaily, ARunIsFollowedToItsEnd)
     };
     const std::string watch = "/usr/sbin/bakjobctl watch daily";
     const Ran lines = beside("/usr/sbin/bakjob -r daily", watch);
-    EXPECT_TRUE(says(lines, 0, "folder 1/1  /mnt/HD/HD_a2/Public  looking what there is to do\n"));
+    EXPECT_TRUE(says(lines, 0, "folder 1/1  /mnt/HD/HD_a2/Public  scanning\n"));
     EXPECT_TRUE(says(lines, 0, " bytes moved\n"));
     EXPECT_TRUE(says(lines, 0, "daily: done "));
     EXPECT_TRUE(says(ctl("watch daily --json"), 0, "\"last\":\"done\""));

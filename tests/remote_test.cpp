@@ -104,8 +104,8 @@ TEST_F(Remote, DaemonProbesAreExact)
 
 TEST_F(Remote, SshCommandsFollowLoginAndAddress)
 {
-    const auto client = SshLogin::as_client;
-    const auto user = SshLogin::as_user;
+    const auto client = SshLogin::AS_CLIENT;
+    const auto user = SshLogin::AS_USER;
     struct Case {
         const char *ip;
         std::string of_client; // with "PW" where the password stands, if there is one

@@ -1,10 +1,11 @@
+// check: what can be seen on this device.
+
 #include "check/findings.h"
 #include "cli/source_folders.h"
 #include "common/job_files.h"
 #include "common/password.h"
 #include "common/private_file.h"
 #include "common/shell_text.h"
-#include "common/text.h"
 #include "config/current_job.h"
 #include "config/job_state.h"
 #include "jobs/config_file.h"
@@ -88,7 +89,7 @@ Verdict verdict_on(const RsyncJob &job, const JobField &field)
 void Check::values()
 {
     if (!name_) {
-        problem("job_name", "no run takes this name", "Add the job anew under another name.");
+        problem("job_name", "it is not allowed as a job's name", "Add the job anew under another name.");
     }
     for (const JobField &field : job_fields()) {
         const std::string why = refusal_of(job_, field);

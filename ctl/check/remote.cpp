@@ -35,7 +35,7 @@ bool is_measured(const RemoteModule &module)
 // an appliance of the same kind use it. False when it is not let in.
 bool measure_modules(RsyncJob job)
 {
-    const bool let_in = try_login(job, SshLogin::as_client).result == SSH_OK;
+    const bool let_in = try_login(job, SshLogin::AS_CLIENT).result == SSH_OK;
     if (let_in) {
         job.server_type = SERVER_SAME_KIND;
         discover_remote(job);

@@ -1,3 +1,5 @@
+// check --probe: what the remote side answers.
+
 #include "check/findings.h"
 #include "check/probe.h"
 #include "cli/source_folders.h"
@@ -108,7 +110,7 @@ void RemoteCheck::report(const std::string &about, const Advice &advice, const s
 bool RemoteCheck::login()
 {
     if (job_.use_ssh != 1 && to_module()) return true;
-    const auto kind = job_.use_ssh == 1 ? ssh_login_of(job_) : SshLogin::as_client;
+    const auto kind = job_.use_ssh == 1 ? ssh_login_of(job_) : SshLogin::AS_CLIENT;
     if (!kind) return false; // the values say why
     RsyncJob job = probe_.job();
     if (job.use_ssh != 1) job.ssh_pwd[0] = '\0';
@@ -161,7 +163,7 @@ void RemoteCheck::preparation(const std::string &folder, const std::string &targ
             "Make this folder there.");
         return;
     }
-    const LoginAnswer reply = try_login(probe_.job(), SshLogin::as_client);
+    const LoginAnswer reply = try_login(probe_.job(), SshLogin::AS_CLIENT);
     const Advice advice = advice_of_login(reply.result);
     if (reply.result != SSH_OK) {
         const bool denied = reply.result == SSH_DENIED;

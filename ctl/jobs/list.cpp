@@ -6,7 +6,6 @@
 #include "output/failure.h"
 
 #include <algorithm>
-#include <cstdio>
 #include <nlohmann/json.hpp>
 
 namespace bakjob::ctl

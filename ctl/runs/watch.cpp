@@ -91,7 +91,7 @@ Progress read_progress(const JobName &name)
     return progress;
 }
 
-// Nothing while it is not known how much there is.
+// Nullopt while scanning: it is not known how much there is.
 std::optional<int> per_cent(const Progress &progress)
 {
     if (!progress.figures || progress.figures->all == 0) return std::nullopt;
@@ -105,7 +105,7 @@ std::string words_of(const Progress &progress)
     if (progress.folder.empty()) return "starting";
     std::string words = "folder " + progress.place + "  " + printable(progress.folder) + "  ";
     const auto share = per_cent(progress);
-    words += share ? format_text("%3d %%", *share) : "looking what there is to do";
+    words += share ? format_text("%3d %%", *share) : "scanning";
     const auto bytes = progress.figures ? progress.figures->bytes : 0;
     if (bytes == 0 && !share) return words;
     return words + format_text("  %llu bytes moved", static_cast<unsigned long long>(bytes));

@@ -2,8 +2,6 @@
 
 #include "xml_tree.h"
 
-#include <algorithm>
-
 using pugi::xml_node;
 
 namespace device

@@ -5,7 +5,6 @@
 #include "platform/device.h"
 #include "store.h"
 
-#include <algorithm>
 #include <cstring>
 #include <new>
 #include <optional>

@@ -13,13 +13,9 @@
 #include "transfer_figures.h"
 
 #include <algorithm>
-#include <cerrno>
-#include <cstdio>
 #include <cstdlib>
-#include <cstring>
 #include <string>
 #include <string_view>
-#include <unistd.h>
 #include <vector>
 
 namespace

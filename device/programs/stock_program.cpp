@@ -41,7 +41,7 @@ sigset_t awaited_signals()
     return signals;
 }
 
-// Nothing while it runs. What it left behind is this process's child as well.
+// Nullopt while it runs. What it left behind is this process's child as well.
 std::optional<int> status_of(pid_t child)
 {
     std::optional<int> status;
@@ -52,7 +52,7 @@ std::optional<int> status_of(pid_t child)
     return status;
 }
 
-// Its wait status; nothing when it has run too long.
+// Its wait status; nullopt when it has run too long.
 std::optional<int> wait_for(pid_t child, const sigset_t &awaited)
 {
     const auto end = Clock::now() + probe_bound();

@@ -196,7 +196,7 @@ int wait_for(pid_t child)
     return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
 }
 
-// Its exit status; nothing when its list was becoming too long. It has moved nothing then.
+// Its exit status; nullopt when its list was becoming too long. It has moved nothing then.
 std::optional<int> run_once(const StockProgram &rsync, const std::vector<std::string> &arguments,
                             std::uint64_t most, Figures &figures, const FiguresFile &file)
 {

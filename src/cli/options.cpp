@@ -31,7 +31,7 @@ struct OptionLoop {
     char decoded[PASSWORD_SIZE] = "";
 };
 
-// An exit status ends the command line; nothing: on with the next option.
+// An exit status ends the command line; nullopt: on with the next option.
 using Ending = std::optional<int>;
 
 Ending reset_stale_states(OptionLoop & /*loop*/, const char * /*argument*/)
@@ -130,6 +130,7 @@ Ending act_on(int letter, OptionLoop &loop)
 
 void print_usage()
 {
+    // A fixed text that others read; bakjob's own version is in CMakeLists.txt.
     std::printf("\nNAME\n\tbakjob - Run Rsync Backup\t[%s]\n\n", "v1.00_20130904");
     for (const char *line : {
              "SYNOPSIS\n\tbakjob [-h] [-n seq] [-r job_name]\n",

@@ -95,8 +95,9 @@ FolderOutcome not_begun(const Refusal &refusal)
     return {BACKUP_FAILED, {.step = RunStep::FOLDER, .seen = refusal.why}};
 }
 
-// `job` becomes that of this folder alone.
-FolderOutcome bring_over(RsyncJob &job, const JobName &name, const Checked &root, const FolderPlace &place)
+// Leaves `job` as that of this folder alone, for the alert.
+FolderOutcome transfer_into_place(RsyncJob &job, const JobName &name, const Checked &root,
+                                  const FolderPlace &place)
 {
     copy_text(job.local_path, place.folder); // for the alert
     if (!root) return not_begun(root.refusal());
@@ -109,7 +110,7 @@ FolderOutcome bring_over(RsyncJob &job, const JobName &name, const Checked &root
 // `job` is a copy for this folder alone.
 FolderOutcome run_folder(RsyncJob job, const JobName &name, const Checked &root, const FolderPlace &place)
 {
-    FolderOutcome outcome = bring_over(job, name, root, place);
+    FolderOutcome outcome = transfer_into_place(job, name, root, place);
     outcome.reason.folder = place.folder;
     raise_alert(job, outcome.result == BACKUP_DONE);
     return outcome;

@@ -15,7 +15,6 @@
 #include <cstring>
 #include <fcntl.h>
 #include <optional>
-#include <string_view>
 #include <sys/stat.h>
 #include <unistd.h>
 

@@ -1,6 +1,6 @@
 #pragma once
 
-// Owners of what the system hands out: they close it when they go. And a write that writes.
+// Owners of what the system hands out: they close it when they go. And write_all.
 
 #include <cerrno>
 #include <cstdio>

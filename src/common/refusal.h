@@ -16,7 +16,7 @@ struct Refusal {
     explicit operator bool() const { return !why.empty(); }
 };
 
-// Trace "ERROR: " and the reason, and give it: of any kind, or "FIELD refused: WHY".
+// Make a refusal and trace it as an error; `refused` words it as "FIELD refused: WHY".
 Refusal trace_refusal(std::string why);
 Refusal refused(std::string_view field, std::string_view why);
 

@@ -4,7 +4,6 @@
 #include "common/interrupt.h"
 #include "common/text.h"
 
-#include <algorithm>
 #include <cerrno>
 #include <csignal>
 #include <cstdio>
@@ -147,7 +146,7 @@ ShellReader::~ShellReader()
 bool ShellReader::read_line(std::string &line)
 {
     const bool read = output_ && bakjob::read_line(output_.get(), line);
-    throw_if_interrupted(); // an end may be none
+    throw_if_interrupted(); // a signal can look like the end of the output
     return read;
 }
 

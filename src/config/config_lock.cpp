@@ -116,10 +116,12 @@ bool move_aside(const char *path)
 
 // A new file is a lock for its creator even when somebody gives it another name at once: whoever moves it
 // aside waits for the lock first. A lock that a neighbour holds, if given, is in the way, too.
-UniqueFd make_lock(const char *path, milliseconds &patience, const UniqueFd &neighbours)
+UniqueFd make_lock(const char *path, milliseconds &patience, const UniqueFd &held_by_neighbour)
 {
     struct stat there = {};
-    const auto is_fine = [&] { return is_lock(there) && !(neighbours && is_at(path, neighbours.get())); };
+    const auto is_fine = [&] {
+        return is_lock(there) && !(held_by_neighbour && is_at(path, held_by_neighbour.get()));
+    };
     const bool in_the_way = lstat(path, &there) == 0 && !is_fine();
     const UniqueFd guard = take_guard(in_the_way);
     UniqueFd linked;
@@ -135,16 +137,16 @@ UniqueFd make_lock(const char *path, milliseconds &patience, const UniqueFd &nei
 UniqueFd take_lock(const char *path)
 {
     milliseconds patience = LINKED_WAIT;
-    UniqueFd neighbours;
+    UniqueFd held_by_neighbour;
     for (int tries = 0; tries < MAX_TRIES; ++tries) {
-        UniqueFd lock = neighbours ? UniqueFd() : open_lock(path);
-        if (!lock) lock = make_lock(path, patience, neighbours);
-        neighbours.reset();
+        UniqueFd lock = held_by_neighbour ? UniqueFd() : open_lock(path);
+        if (!lock) lock = make_lock(path, patience, held_by_neighbour);
+        held_by_neighbour.reset();
         if (!lock) continue;
         const Wait wait = wait_for_flock(path, lock.get());
         if (wait == Wait::FAILED) return UniqueFd();
         if (wait == Wait::NEIGHBOUR) {
-            neighbours = std::move(lock);
+            held_by_neighbour = std::move(lock);
             continue;
         }
         // Somebody may have replaced the file while we waited: then the lock is on the new one.

@@ -1,6 +1,5 @@
 #include "config/job.h"
 
-#include "common/debug_log.h"
 #include "common/job_files.h"
 #include "common/text.h"
 

@@ -98,7 +98,7 @@ char *text_field(RsyncJob &job, const JobField &field);
 const std::int32_t &integer_field(const RsyncJob &job, const JobField &field);
 const char *text_field(const RsyncJob &job, const JobField &field);
 
-// Of a job with a text that commands need and that was cut.
+// Refuses a job with a cut text that commands need; empty for any other.
 Refusal refusal_of_cut_text(const RsyncJob &job);
 
 // The text of that key as it is in the store, when the field has only its start; else null.

@@ -1,9 +1,10 @@
 #pragma once
 
 // Whole-job operations for the other parts of the appliance. Each is one complete cycle over the
-// configuration store and leaves the job list empty. They answer 1 for success and 0 when the job was not
-// found, the change was refused, or the jobs could not all be loaded; then the store is as it was. None
-// copies the configuration to flash.
+// configuration store and leaves the job list empty. They answer 0 when the job was not found, the change was
+// refused, or the jobs could not all be loaded; then the store is as it was. Else 1, also when the save
+// failed, which only the trace says: who must know uses rsync_change_jobs. None copies the configuration to
+// flash.
 
 #include "config/job.h"
 

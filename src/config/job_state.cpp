@@ -1,7 +1,6 @@
 #include "config/job_state.h"
 
 #include "common/debug_log.h"
-#include "common/interrupt.h"
 #include "common/job_files.h"
 #include "common/run_options.h"
 #include "common/text.h"
@@ -43,7 +42,7 @@ void forget_unrecorded(const std::string &job_name, StateKind kind)
 
 StateKind kind_of_run()
 {
-    return run_options.restore_mode != 0 ? StateKind::RESTORE : StateKind::BACKUP;
+    return is_restore_run() ? StateKind::RESTORE : StateKind::BACKUP;
 }
 
 void set_state(RsyncJob &job, StateKind kind, std::int32_t state, const std::string &time)

@@ -12,7 +12,6 @@
 #include <cstring>
 #include <memory>
 #include <new>
-#include <string_view>
 #include <unordered_set>
 #include <utility>
 

@@ -74,7 +74,7 @@ bool runs_job(pid_t pid, std::string_view job_name)
 }
 
 // Of the process that the pid file names; `file` is a word of a command in backquotes.
-bool is_restore_run(const std::string &ps, const std::string &file)
+bool is_of_restore_run(const std::string &ps, const std::string &file)
 {
     return run_shell(format_text("%s | grep `cat %s`'' | grep -- ' -i ' | grep -v '%s'  >/dev/null 2>&1",
                                  ps.c_str(), file.c_str(), ps.c_str())) == 0;
@@ -145,7 +145,7 @@ int rsync_kill_job_process(const JobName &job)
     }
     const std::string ps = rsync_ps_command();
     const std::string file = in_backquotes(escape_path(path));
-    if (is_restore_run(ps, file)) run_options.restore_mode = 1;
+    if (is_of_restore_run(ps, file)) run_options.restore_mode = 1;
     return run_shell(format_text("kill -9 `cat %s`", file.c_str()));
 }
 

@@ -114,18 +114,18 @@ bool write_entry(const std::string &path, const ScheduleEntry &entry)
 void delete_entry(int entry, int entries_left)
 {
     xml_del(entry_path(entry).c_str());
-    store_decimal(ENTRY_COUNT, entries_left);
+    set_store_decimal(ENTRY_COUNT, entries_left);
 }
 
 bool list_group(int number)
 {
-    return set_store_text(group_name_path(number), GROUP) && store_decimal(GROUP_COUNT, number);
+    return set_store_text(group_name_path(number), GROUP) && set_store_decimal(GROUP_COUNT, number);
 }
 
 void delete_group(const Group &group)
 {
     xml_del(group.name_path.c_str());
-    store_decimal(GROUP_COUNT, group.groups - 1);
+    set_store_decimal(GROUP_COUNT, group.groups - 1);
     xml_del(GROUP_NODE);
 }
 
@@ -255,7 +255,7 @@ bool rsync_add_schedule(const ScheduleEntry &entry)
     if (store_has(path)) return false;
     if (group.name_path.empty() && store_has(group_name_path(groups + 1))) return false;
     const bool added = write_entry(path, entry) && (!group.name_path.empty() || list_group(groups + 1)) &&
-                       store_decimal(ENTRY_COUNT, entries + 1);
+                       set_store_decimal(ENTRY_COUNT, entries + 1);
     if (!added) xml_del(path.c_str());
     return added;
 }

@@ -55,7 +55,7 @@ inline bool set_store_text(const std::string &path, const std::string &text)
     return xml_set_str(path.c_str(), text.c_str()) >= 0;
 }
 
-inline bool store_decimal(const std::string &path, int value)
+inline bool set_store_decimal(const std::string &path, int value)
 {
     return set_store_text(path, std::to_string(value));
 }

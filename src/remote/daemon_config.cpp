@@ -6,7 +6,6 @@
 #include "common/shell.h"
 #include "common/shell_text.h"
 #include "common/text.h"
-#include "config/current_job.h"
 #include "remote/ssh_login.h"
 
 #include <algorithm>
@@ -109,7 +108,7 @@ std::optional<std::string> section_name(std::string_view line)
 {
     constexpr std::size_t NAME_STARTS = 2;
     if (!contains(line, "[") || contains(line, PATH_KEY)) return std::nullopt;
-    // Behind what was kept of a line may stand the last bracket.
+    // The closing bracket may be in the part that was cut off.
     if (line.size() == LINE_LENGTH) return std::string(line.substr(NAME_STARTS));
     const std::size_t bracket = line.rfind(']');
     if (bracket == std::string_view::npos || bracket < NAME_STARTS + 1) return std::nullopt;
@@ -140,7 +139,7 @@ FetchedConfig fetch_daemon_config(const RsyncJob &job, const std::string &local_
 {
     const Checked word = shell_path("local copy", local_copy);
     if (!word) return {-1, word.refusal()};
-    const Checked command = ssh_command(job, SshLogin::as_client, "cat /etc/rsyncd.conf > " + *word);
+    const Checked command = ssh_command(job, SshLogin::AS_CLIENT, "cat /etc/rsyncd.conf > " + *word);
     if (!command) return {-1, command.refusal()};
     // The shell would write through a link of that name: with a file of ours in place nobody else can put
     // one.

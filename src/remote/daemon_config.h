@@ -15,11 +15,11 @@
 namespace bakjob
 {
 
-// The name between the two inner blanks of a section header, or nothing when the line has no brackets around
+// The name between the two inner blanks of a section header, or nullopt when the line has no brackets around
 // one.
 std::optional<std::string> section_name(std::string_view line);
 
-// The folder of a path line, or nothing when the line has no "path = ".
+// The folder of a path line, or nullopt when the line has no "path = ".
 std::optional<std::string> path_of_line(std::string_view line);
 
 // Reads a local copy of the configuration line by line, without trailing white space, until the visitor
@@ -35,7 +35,7 @@ struct FetchedConfig {
 // for the copy to be there. The caller removes the copy.
 FetchedConfig fetch_daemon_config(const RsyncJob &job, const std::string &local_copy);
 
-// What to say of an exit code.
+// The words for a fetch that ended with this code.
 std::string not_fetched(int exit_code);
 
 } // namespace bakjob

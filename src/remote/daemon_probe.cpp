@@ -38,7 +38,7 @@ Checked write_test_command(const RsyncJob &job, int direction)
     std::string password;
     if (daemon) {
         const auto name = JobName::checked(job.job_name);
-        if (!name) return refused("job_name", "no run can have it");
+        if (!name) return refused("job_name", "not allowed as a job's name");
         password = format_text("--password-file=%s ", in_double_quotes(password_file(*name)).c_str());
     }
     const Reached how = daemon ? Reached::BY_DAEMON : Reached::OVER_SSH;

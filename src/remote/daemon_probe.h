@@ -1,8 +1,8 @@
 #pragma once
 
 // Two probes of the remote rsync daemon, before a transfer: does it answer, and would the transfer be let in?
-// What the first line of output classifies as; a value that may not stand in a command gives REPLY_ERROR and
-// nothing is run.
+// The first line of a probe's output is classified (reply.h). A value that may not stand in a command gives
+// REPLY_ERROR, and nothing is run.
 
 #include "config/job.h"
 #include "remote/reply.h"

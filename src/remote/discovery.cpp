@@ -163,7 +163,7 @@ RemoteReplyCode check_remote_secret(const RsyncJob &job)
         return REPLY_AUTH_FAILED;
     }
     const auto command =
-        ssh_command(job, SshLogin::as_client, "cat /etc/rsyncd.secrets 2>/dev/null | grep root:");
+        ssh_command(job, SshLogin::AS_CLIENT, "cat /etc/rsyncd.secrets 2>/dev/null | grep root:");
     if (!command) return REPLY_AUTH_FAILED;
     ShellReader reply(*command);
     std::string line;

@@ -53,7 +53,7 @@ MadeFolder make_remote_folder(const RsyncJob &job, const JobName &name, const st
 {
     const Checked folder = find_module_folder(job, name, module);
     if (!folder) return {-1, folder.refusal()};
-    // The folder is the remote side's own word for it.
+    // The remote side chose this text.
     if (!folder->starts_with('/')) return {-1, refused("module path", "not absolute")};
     const Checked safe_folder = shell_path("module path", *folder);
     const Checked safe_target = shell_path("remote folder", first + '/' + second);

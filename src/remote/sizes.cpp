@@ -10,7 +10,6 @@
 #include "config/current_job.h"
 #include "remote/ssh_login.h"
 
-#include <cstring>
 #include <optional>
 #include <vector>
 
@@ -28,7 +27,7 @@ bool is_du_size(std::string_view text)
     return begins_with_digit && (text.size() == 1 || contains("kKMG", text.substr(text.size() - 1)));
 }
 
-// The first line that a remote command prints; of a refused one, the empty line. Nothing when it could not be
+// The first line that a remote command prints; of a refused one, the empty line. Nullopt when it could not be
 // started.
 std::optional<std::string> reply_of(const Checked &command)
 {
@@ -39,7 +38,7 @@ std::optional<std::string> reply_of(const Checked &command)
 // what stands before the folder and behind it. The blanks differ.
 std::string du_as_client(const RsyncJob &job, const std::string &folder)
 {
-    const auto question = ssh_command(job, SshLogin::as_client, "ls /usr/bin/du 2>/dev/null");
+    const auto question = ssh_command(job, SshLogin::AS_CLIENT, "ls /usr/bin/du 2>/dev/null");
     const bool present = question && rsync_remote_has_du(*question) == 1;
     const AddressKind kind = ip_address_kind(job.remote_ip);
     if (present) {
@@ -56,11 +55,11 @@ Checked du_command(const RsyncJob &job, const std::string &folder)
     const auto login = ssh_login_of(job);
     if (!login) return NO_SSH_LOGIN;
     return ssh_command(job, *login,
-                       *login == SshLogin::as_client ? du_as_client(job, folder)
+                       *login == SshLogin::AS_CLIENT ? du_as_client(job, folder)
                                                      : "du -sh " + folder + " 2>&1");
 }
 
-// Nothing when a folder cannot be asked for: a total without it would be wrong.
+// Nullopt when a folder cannot be asked for: a total without it would be wrong.
 std::optional<std::string> local_du_command(char *folders)
 {
     FolderTable table{};

@@ -11,8 +11,8 @@ namespace bakjob
 
 std::optional<SshLogin> ssh_login_of(const RsyncJob &job)
 {
-    if (job.server_type == SERVER_SAME_KIND) return SshLogin::as_client;
-    if (job.server_type == SERVER_ANY) return SshLogin::as_user;
+    if (job.server_type == SERVER_SAME_KIND) return SshLogin::AS_CLIENT;
+    if (job.server_type == SERVER_ANY) return SshLogin::AS_USER;
     return std::nullopt;
 }
 
@@ -40,7 +40,7 @@ Checked ssh_command(const RsyncJob &job, SshLogin login, std::string_view remote
     const std::string host = scoped_host(job.remote_ip);
 
     std::string command = "/usr/sbin/ssh ";
-    if (login == SshLogin::as_client) {
+    if (login == SshLogin::AS_CLIENT) {
         command += option + ' ' + six + host;
     } else {
         if (Refusal refusal = refusal_of_ssh_user(job.ssh_user)) return refusal;
@@ -54,7 +54,7 @@ Checked ssh_command(const RsyncJob &job, SshLogin login, std::string_view remote
 
 int run_remotely(const RsyncJob &job, std::string_view command)
 {
-    const Checked ssh = ssh_command(job, SshLogin::as_client, command);
+    const Checked ssh = ssh_command(job, SshLogin::AS_CLIENT, command);
     return ssh ? run_shell(*ssh) : -1;
 }
 

@@ -14,8 +14,8 @@ namespace bakjob
 {
 
 enum class SshLogin {
-    as_client, // no login name: the ssh client's own default
-    as_user    // the job's `ssh_user`
+    AS_CLIENT, // no login name: the ssh client's own default
+    AS_USER    // the job's `ssh_user`
 };
 
 // How jobs of a server type log in; nullopt for a type that has no login.

@@ -19,7 +19,7 @@ namespace
 
 struct Fragment {
     std::string_view text;
-    std::optional<SshTestResult> result; // nothing: the host key has changed
+    std::optional<SshTestResult> result; // nullopt: the host key has changed
 };
 
 constexpr std::array FRAGMENTS = {

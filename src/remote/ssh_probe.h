@@ -37,7 +37,7 @@ SshTestResult ssh_test();
 // The command of the test.
 Checked ssh_test_command(const RsyncJob &job, SshLogin login);
 
-// What the first line of a login's reply means; nothing: the host's key has changed.
+// What the first line of a login's reply means; nullopt: the host's key has changed.
 std::optional<SshTestResult> judge_ssh_reply(std::string_view line);
 
 } // namespace bakjob

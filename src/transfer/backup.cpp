@@ -24,7 +24,6 @@
 #include <fcntl.h>
 #include <sys/select.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
 namespace bakjob
 {
@@ -39,7 +38,7 @@ FolderOutcome failed(BackupResult result, const Reason &reason)
     return {result, reason};
 }
 
-// The reason of a refusal; none of an empty one.
+// The outcome of a step that may have been refused.
 FolderOutcome judged(RunStep step, const Refusal &refusal)
 {
     if (!refusal) return {BACKUP_DONE};
@@ -148,7 +147,7 @@ FolderOutcome FolderRun::make_target(const ProbeReply &missing)
 FolderOutcome FolderRun::check_command()
 {
     if (!plan_.command) return judged(RunStep::COMMAND, plan_.command.refusal());
-    // It names the contents of a folder, and those of one behind a link just as well.
+    // It ends in a slash for a folder, and would follow a link put in its place: guard that path, too.
     const Place place = look_at(job_.local_path);
     if (place.is_folder) plan_.row.emplace_back(job_.local_path);
     std::remove(transfer_file(name_).c_str());

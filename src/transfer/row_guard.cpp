@@ -16,7 +16,7 @@ namespace
 
 constexpr mode_t NOTHING = 0;
 
-// The type bits of what stands at the path, or NOTHING; none (errno) when that cannot be told.
+// The type bits of what stands at the path, or NOTHING; nullopt (errno) when that cannot be told.
 std::optional<mode_t> type_at(const std::string &path)
 {
     struct stat status = {};

@@ -19,7 +19,7 @@ bool keeps_snapshots(const RsyncJob &job);
 // none.
 std::vector<std::string> snapshots_in_use(const RsyncJob &job);
 
-// What is wrong with a path at which a folder must stand, or nothing; empty when that is so.
+// Why something else than a folder stands at the path, in words; empty when a folder or nothing does.
 std::string why_no_folder(const std::string &path);
 
 // What stands at a path. Refused when that cannot be told: a folder that passes for a file would be copied to

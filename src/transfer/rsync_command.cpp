@@ -21,7 +21,8 @@ namespace
 Refusal refusal_of_values(const RsyncJob &job, bool named)
 {
     if (Refusal refusal = refusal_of_cut_text(job)) return refusal;
-    if (job.job_name[0] != '\0' && !is_job_name(job.job_name)) return refused("job_name", "no run has it");
+    if (job.job_name[0] != '\0' && !is_job_name(job.job_name))
+        return refused("job_name", "not allowed as a job's name");
     if (Refusal refusal = refusal_of_host(job.remote_ip)) return refusal;
     if (Refusal refusal = refusal_of_port(job.port)) return refusal;
     if (named && job.rsync_mode == RSYNC_MODE_DAEMON) {
