@@ -7,6 +7,8 @@
 #include "support.h"
 #include "transfer/plan.h"
 
+#include <filesystem>
+
 using namespace bakjob;
 
 namespace
@@ -91,6 +93,25 @@ TEST_F(Reasons, AreOfTheirFolderAndOfTheRunItself)
     EXPECT_TRUE(has(run_job("daily", false).reason.seen, "is running"));
 }
 
+TEST_F(Reasons, AFolderThatALinkReplacesInAProbeIsNotFollowed)
+{
+    const std::string folder = SHARE + "/x";
+    const std::string script = "case $kind in\nwrite) rm -r " + folder + "; ln -s /etc " + folder +
+                               " ;;\ndry | run) echo \"$*\" >>/tmp/transfers ;;\nesac\n";
+    for (const char *direction : {"1", "2"}) {
+        SetUp();
+        std::filesystem::remove_all(folder);
+        std::filesystem::create_directories(folder);
+        const Fake rsync(RSYNC, KIND_OF_CALL + script);
+        add_job({{"local_path", folder}, {"backup_type", direction}});
+        run_job("daily", false);
+        EXPECT_TRUE(has(read_file("/tmp/transfers"), folder));
+        EXPECT_FALSE(has(read_file("/tmp/transfers"), " " + folder + "/")) << read_file("/tmp/transfers");
+        std::filesystem::remove("/tmp/transfers");
+        std::filesystem::remove(folder);
+    }
+}
+
 TEST_F(Reasons, ThePlanSaysWhatWillBeDone)
 {
     using enum RunStep;
@@ -112,9 +133,9 @@ TEST_F(Reasons, ThePlanSaysWhatWillBeDone)
         job.inc_enable = one.inc_enable;
         job.inc_number = 4;
         run_options.recover_seq = one.recover;
-        const TransferPlan plan = plan_transfer(job, job);
+        const TransferPlan plan = plan_transfer(job);
         EXPECT_FALSE(plan.refusal);
-        EXPECT_TRUE(plan.command) << plan.command.refusal().why;
+        EXPECT_TRUE(planned_command(job, job));
         EXPECT_EQ(plan.steps, one.steps);
         EXPECT_EQ(plan.row.size(), one.row);
         EXPECT_EQ(plan.newest.empty(), !plan.has(SNAPSHOTS));
@@ -122,8 +143,8 @@ TEST_F(Reasons, ThePlanSaysWhatWillBeDone)
     run_options.recover_seq = 0;
     RsyncJob job = make_job("daily");
     job.server_type = 3;
-    EXPECT_EQ(plan_transfer(job, job).refusal.why, "server_type refused: 3");
-    EXPECT_TRUE(plan_transfer(job, job).steps.empty());
+    EXPECT_EQ(plan_transfer(job).refusal.why, "server_type refused: 3");
+    EXPECT_TRUE(plan_transfer(job).steps.empty());
 }
 
 } // namespace

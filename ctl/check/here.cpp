@@ -309,7 +309,7 @@ void Check::folder(const std::string &root, const std::string &folder)
     }
     RsyncJob ended = job_;
     Refusal refusal = set_ends(ended, folder);
-    if (!refusal) refusal = plan_transfer(ended, rsync_with_defaults(ended)).command.refusal();
+    if (!refusal) refusal = planned_command(ended, rsync_with_defaults(ended)).refusal();
     if (refusal) problem(folder, refusal.why, "A run cannot transfer it. Set what is refused anew.");
 }
 

@@ -213,11 +213,11 @@ void RemoteCheck::folder(const std::string &folder)
     } else if (target.result == REPLY_NO_DIR && to_module()) {
         preparation(folder, ended.remote_path);
     } else {
-        DaemonAnswer transfer = try_transfer(plan_transfer(ended, ended).command);
+        DaemonAnswer transfer = try_transfer(planned_command(ended, ended));
         if (transfer.result == REPLY_OK && pushes && !to_module()) {
             // The dry run of a folder does not say that its parent is missing; that of a file does.
             copy_text(ended.local_path, "/etc/hosts");
-            transfer = try_transfer(plan_transfer(ended, ended).command);
+            transfer = try_transfer(planned_command(ended, ended));
         }
         report(folder, advice_of_reply(transfer.result), transfer.line);
     }

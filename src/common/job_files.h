@@ -29,7 +29,7 @@ std::string progress_file(const JobName &job);
 // A job's state that could not be written into the configuration (config/unrecorded_state.h).
 std::string unrecorded_file(const JobName &job);
 
-// Written by the appliance's rsync: what a transfer has moved, and the sizes that its dry run found.
+// Written by the appliance's rsync: how far a transfer is, and what it has moved when it has ended.
 std::string transfer_file(const JobName &job);
 std::string transfer_size_file(const JobName &job);
 

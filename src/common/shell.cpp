@@ -82,9 +82,8 @@ pid_t start_shell(const std::string &command, int output, sigset_t signals)
                     const_cast<char *const *>(environment));
     posix_spawnattr_destroy(&attributes);
     posix_spawn_file_actions_destroy(&handles);
-    if (failure == 0) return child;
-    DebugLog("ERROR: the shell could not be started: %s\n", std::strerror(failure));
-    return -1;
+    errno = failure;
+    return failure == 0 ? child : -1;
 }
 
 int wait_for(pid_t child)
@@ -117,7 +116,9 @@ int run_shell(const std::string &command)
     std::fflush(stdout);
     const IgnoreTerminal ignore;
     const pid_t child = start_shell(command, -1, ignore.not_ignored_before());
-    return child < 0 ? -1 : wait_for(child);
+    if (child >= 0) return wait_for(child);
+    DebugLog("ERROR: the shell could not be started: %s\n", std::strerror(errno));
+    return -1;
 }
 
 ShellReader::ShellReader(const std::string &command)
@@ -125,10 +126,7 @@ ShellReader::ShellReader(const std::string &command)
     throw_if_interrupted();
     std::fflush(stdout);
     int ends[2];
-    if (pipe2(ends, O_CLOEXEC) != 0) {
-        DebugLog("ERROR: no pipe for a command: %s\n", std::strerror(errno));
-        return;
-    }
+    if (pipe2(ends, O_CLOEXEC) != 0) return;
     UniqueFd reading(ends[0]);
     const UniqueFd writing(ends[1]);
     child_ = start_shell(command, writing.get(), {});

@@ -29,7 +29,7 @@ inline bool fits_command(const std::string &command)
     return command.size() < COMMAND_SIZE;
 }
 
-// What is seen of a command that could not be started; the trace says why.
+// What is seen of a command that could not be started.
 inline constexpr const char *NOT_STARTED = "the command could not be started";
 
 // Runs the command and waits. Its wait status, 0 for success; -1 when it could not be started.

@@ -100,7 +100,7 @@ std::string grep_word(std::string_view job_name)
 
 Refusal refusal_of_host(std::string_view remote_ip)
 {
-    if (remote_ip.empty()) return refused("remote_ip", "empty");
+    if (remote_ip.empty()) return {"remote_ip refused: empty"}; // without a trace: there is nothing to ask
     // A bracket pair is the caller's to write, around an IPv6 address.
     return refusal_of_name("remote_ip", remote_ip, "/@");
 }

@@ -59,7 +59,7 @@ private:
     FolderOutcome ask_daemon();
     FolderOutcome reach_target();
     FolderOutcome make_target(const ProbeReply &missing);
-    FolderOutcome check_command();
+    FolderOutcome write_command();
     FolderOutcome move_snapshots_up();
     FolderOutcome transfer();
     FolderOutcome transfer_with_retries();
@@ -67,7 +67,8 @@ private:
 
     const JobName &name_;
     const RsyncJob &job_;
-    TransferPlan plan_ = plan_transfer(job_, CurrentJob);
+    TransferPlan plan_ = plan_transfer(job_);
+    std::string command_;
 };
 
 FolderOutcome FolderRun::carry_out()
@@ -81,7 +82,7 @@ FolderOutcome FolderRun::carry_out()
         Act{RunStep::PASSWORD, &FolderRun::give_password},
         Act{RunStep::DAEMON, &FolderRun::ask_daemon},
         Act{RunStep::TARGET, &FolderRun::reach_target},
-        Act{RunStep::COMMAND, &FolderRun::check_command},
+        Act{RunStep::COMMAND, &FolderRun::write_command},
         Act{RunStep::SNAPSHOTS, &FolderRun::move_snapshots_up},
         Act{RunStep::TRANSFER, &FolderRun::transfer},
     };
@@ -144,14 +145,18 @@ FolderOutcome FolderRun::make_target(const ProbeReply &missing)
     return failed(BACKUP_REMOTE_FAILED, reason);
 }
 
-FolderOutcome FolderRun::check_command()
+FolderOutcome FolderRun::write_command()
 {
-    if (!plan_.command) return judged(RunStep::COMMAND, plan_.command.refusal());
-    // It ends in a slash for a folder, and would follow a link put in its place: guard that path, too.
+    // The command ends in a slash for a folder, and would follow a link put in its place: guard that path,
+    // too, from before the command is written.
     const Place place = look_at(job_.local_path);
+    if (place.refusal) return judged(RunStep::FOLDER, place.refusal);
     if (place.is_folder) plan_.row.emplace_back(job_.local_path);
-    std::remove(transfer_file(name_).c_str());
-    return judged(RunStep::FOLDER, place.refusal);
+    const Checked command = planned_command(job_, CurrentJob);
+    if (!command) return judged(RunStep::COMMAND, command.refusal());
+    command_ = *command;
+    std::remove(transfer_file(name_).c_str()); // figures of an earlier transfer
+    return {BACKUP_DONE};
 }
 
 FolderOutcome FolderRun::move_snapshots_up()
@@ -164,9 +169,9 @@ FolderOutcome FolderRun::move_snapshots_up()
 
 FolderOutcome FolderRun::transfer()
 {
-    DebugLog("rsync_cmd = [%s]\n", plan_.command->c_str());
+    DebugLog("rsync_cmd = [%s]\n", command_.c_str());
     rsync_set_job_state(name_.text(), is_recover_run() ? JOB_RECOVER_RUNNING : JOB_RUNNING);
-    DebugLog("rsync_cmd = [%s]\n", dry_run_of(*plan_.command).c_str());
+    DebugLog("rsync_cmd = [%s]\n", dry_run_of(command_).c_str());
     FolderOutcome outcome = transfer_with_retries();
     if (plan_.newest.empty()) return outcome;
     DebugLog("inc_root_path = [%s]\n", plan_.newest.c_str());
@@ -197,7 +202,7 @@ FolderOutcome FolderRun::transfer_once()
     const auto ended = [](RunStep step, int code) {
         return failed(BACKUP_FAILED, {.step = step, .seen = code < 0 ? NOT_STARTED : "", .exit_code = code});
     };
-    int code = exit_code(run_shell(dry_run_of(*plan_.command)));
+    int code = exit_code(run_shell(dry_run_of(command_)));
     if (code != 0 && code != RSYNC_PARTIAL) {
         std::remove(transfer_size_file(name_).c_str());
         return ended(RunStep::DRY_RUN, code);
@@ -206,7 +211,7 @@ FolderOutcome FolderRun::transfer_once()
     if (!plan_.newest.empty()) {
         if (const Refusal refusal = take_mark_away(plan_.newest)) return judged(RunStep::SNAPSHOTS, refusal);
     }
-    code = exit_code(run_shell(with_dump_size(*plan_.command)));
+    code = exit_code(run_shell(with_dump_size(command_)));
     return code == 0 ? FolderOutcome{BACKUP_DONE} : ended(RunStep::TRANSFER, code);
 }
 

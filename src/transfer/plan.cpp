@@ -34,13 +34,6 @@ std::vector<RunStep> steps_of(const RsyncJob &job)
     return steps;
 }
 
-Checked command_that_fits(const RsyncJob &job, const RsyncJob &filled)
-{
-    Checked command = transfer_command(job, filled);
-    if (command && !fits_command(dry_run_of(*command))) return refused("transfer command", "too long");
-    return command;
-}
-
 } // namespace
 
 bool TransferPlan::has(RunStep step) const
@@ -48,12 +41,19 @@ bool TransferPlan::has(RunStep step) const
     return std::find(steps.begin(), steps.end(), step) != steps.end();
 }
 
-TransferPlan plan_transfer(const RsyncJob &job, const RsyncJob &filled)
+TransferPlan plan_transfer(const RsyncJob &job)
 {
-    if (Refusal refusal = refusal_of_job(job)) return {refusal, {}, {}, refusal, ""};
-    TransferPlan plan{{}, steps_of(job), snapshots_in_use(job), command_that_fits(job, filled), ""};
+    if (Refusal refusal = refusal_of_job(job)) return {refusal, {}, {}, ""};
+    TransferPlan plan{{}, steps_of(job), snapshots_in_use(job), ""};
     if (plan.has(RunStep::SNAPSHOTS)) plan.newest = snapshot_path(job.local_path, job.job_name, 0);
     return plan;
+}
+
+Checked planned_command(const RsyncJob &job, const RsyncJob &filled)
+{
+    Checked command = transfer_command(job, filled);
+    if (command && !fits_command(dry_run_of(*command))) return refused("transfer command", "too long");
+    return command;
 }
 
 std::string with_dump_size(const std::string &command)
